@@ -1,0 +1,62 @@
+// Ports that record what they are told. The hardware description can make their set-up fail, with
+// the property "setup" and the value "fail" in any section.
+#include "backends/check-backend.h"
+
+#include <algorithm>
+
+#include "backends/tables.h"
+
+namespace {
+
+CheckBackendData *data_of(IOPort *ioport) {
+  return static_cast<CheckBackendData *>(io_port_backend_data(ioport));
+}
+
+bool setup(IOPort *ioport, bool /*initial_level*/) {
+  CheckBackendData *data = data_of(ioport);
+  data->setup_ok = std::none_of(
+      data->properties.begin(), data->properties.end(),
+      [](const auto &property) { return property.key == "setup" && property.value == "fail"; });
+  return data->setup_ok;
+}
+
+std::uint32_t get_state(IOPort *ioport) {
+  return static_cast<std::uint32_t>(data_of(ioport)->state);
+}
+
+void set_state(IOPort *ioport, std::int32_t level) {
+  data_of(ioport)->state = level;
+}
+
+void start_watch(IOPort *ioport) {
+  data_of(ioport)->watching = true;
+}
+
+void set_direction(IOPort *ioport, bool input) {
+  data_of(ioport)->direction = input ? 1 : 0;
+}
+
+void set_property(IOPort *ioport, const char *section, const char *key, const char *value) {
+  data_of(ioport)->properties.push_front({section, key, value});
+}
+
+void free_data(IOPort *ioport) {
+  io_port_set_backend_data(ioport, nullptr);
+}
+
+constexpr PortFunctions kFunctions = {
+    .setup = setup,
+    .get_state = get_state,
+    .set_state = set_state,
+    .start_watch = start_watch,
+    .set_direction = set_direction,
+    .set_property = set_property,
+    .free = free_data,
+};
+
+}  // namespace
+
+const PortFunctions *check_backend_functions(IOPort *ioport) {
+  io_port_make_backend_data<CheckBackendData>(ioport);
+  return &kFunctions;
+}

@@ -1,0 +1,165 @@
+// Inputs made of a kernel attribute file that holds "0" or "1". The file is polled; a latched flag
+// can be cleared after a 1 was read.
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <cstdlib>
+#include <limits>
+#include <string>
+#include <string_view>
+
+#include "backends/tables.h"
+#include "base/log.h"
+#include "base/source.h"
+#include "base/unique-fd.h"
+
+namespace {
+
+// Longer than any attribute that holds a flag; one byte is for the terminating zero.
+constexpr std::size_t kReadBuffer = 64;
+
+struct SysfsBackendData : PortBackendData {
+  std::string path;
+  UniqueFd fd;
+  std::uint32_t timeout = 0;  // milliseconds between two polls
+  std::uint32_t state = 0;    // the last raw reading, after inversion
+  Source source;
+  bool clear_flag = false;
+  bool inverted = false;
+};
+
+SysfsBackendData *data_of(IOPort *ioport) {
+  return static_cast<SysfsBackendData *>(io_port_backend_data(ioport));
+}
+
+bool setup(IOPort *port, bool /*initial_level*/) {
+  SysfsBackendData *data = data_of(port);
+  g_assert(data != NULL);
+  if (io_port_get_type(port) != PORT_INPUT) {
+    log_warning("Port %s: a sysfs port can only be an input", io_port_describe(port));
+    return false;
+  }
+  data->fd.reset(open(data->path.c_str(), (data->clear_flag ? O_RDWR : O_RDONLY) | O_CLOEXEC));
+  if (!data->fd && !io_port_is_optional(port)) {
+    log_warning("Failed to open %s: %s", data->path.c_str(), g_strerror(errno));
+  }
+  return static_cast<bool>(data->fd);
+}
+
+std::uint32_t get_state(IOPort *ioport) {
+  return data_of(ioport)->state != 0 ? 1 : 0;
+}
+
+void set_state(IOPort * /*ioport*/, std::int32_t /*level*/) {}
+
+void seek_to_start(const SysfsBackendData *data) {
+  (void)lseek(data->fd.get(), 0, SEEK_SET);
+}
+
+// The attribute's number, limited to 32 bits on every host as it is on the device.
+int parse_number(const SysfsBackendData *data, const char *text) {
+  using Limits = std::numeric_limits<std::int32_t>;
+  errno = 0;
+  long number = std::strtol(text, nullptr, 10);
+  if (number > Limits::max() || number < Limits::min()) {
+    number = number > 0 ? Limits::max() : Limits::min();
+    errno = ERANGE;
+  }
+  if (errno != 0) {
+    log_warning("Unexpected format when parsing input when reading: %s! : %s", data->path.c_str(),
+                g_strerror(errno));
+  }
+  return static_cast<int>(number);
+}
+
+void clear_latched_flag(const SysfsBackendData *data) {
+  if (write(data->fd.get(), "0", 1) != 1) {
+    log_warning("Sysfs write failed: %s", g_strerror(errno));
+  }
+  seek_to_start(data);
+}
+
+// The flag that the file holds, before inversion. Whatever is neither 0 nor 1 counts as 0.
+bool interpret(const SysfsBackendData *data, int number) {
+  if (number == 1) {
+    if (data->clear_flag) {
+      clear_latched_flag(data);
+    }
+    return true;
+  }
+  if (number != 0) {
+    log_warning("Unexpected value: %d when reading: %s", number, data->path.c_str());
+  }
+  return false;
+}
+
+bool read_level(const SysfsBackendData *data) {
+  if (!data->fd) {
+    return data->inverted;
+  }
+  std::array<char, kReadBuffer> text{};
+  if (read(data->fd.get(), text.data(), text.size() - 1) < 0) {
+    log_warning("Error failed to read %s! : %s", data->path.c_str(), g_strerror(errno));
+    return false;
+  }
+  seek_to_start(data);
+  return interpret(data, parse_number(data, text.data())) != data->inverted;
+}
+
+gboolean poll_file(gpointer user_data) {
+  auto *port = static_cast<IOPort *>(user_data);
+  SysfsBackendData *data = data_of(port);
+  const std::uint32_t old = data->state;
+  data->state = read_level(data) ? 1 : 0;
+  const bool logical = io_port_get_state(port);
+  if (data->state != old) {
+    io_port_report_state(port, logical);
+  }
+  return G_SOURCE_CONTINUE;
+}
+
+void start_watch(IOPort *port) {
+  SysfsBackendData *data = data_of(port);
+  data->source = Source(g_timeout_add(data->timeout, poll_file, port));
+}
+
+void set_direction(IOPort * /*ioport*/, bool /*input*/) {}
+
+void set_property(IOPort *port, const char *section, const char *key, const char *value) {
+  auto *data = io_port_make_backend_data<SysfsBackendData>(port);
+  const std::string_view name = key;
+  if (std::string_view(section) != "device") {
+    log_warning("Could not parse backend data!");
+  } else if (name == "path") {
+    data->path = value;
+  } else if (name == "timeout") {
+    data->timeout = static_cast<std::uint32_t>(g_ascii_strtoll(value, nullptr, 0));
+  } else if (name == "clear_flag") {
+    data->clear_flag = std::string_view(value) == "true";
+  } else if (name == "inverted") {
+    data->inverted = std::string_view(value) == "true";
+  }
+}
+
+void free_data(IOPort *port) {
+  io_port_set_backend_data(port, nullptr);
+}
+
+constexpr PortFunctions kFunctions = {
+    .setup = setup,
+    .get_state = get_state,
+    .set_state = set_state,
+    .start_watch = start_watch,
+    .set_direction = set_direction,
+    .set_property = set_property,
+    .free = free_data,
+};
+
+}  // namespace
+
+const PortFunctions *sysfs_backend_functions(IOPort *port) {
+  io_port_make_backend_data<SysfsBackendData>(port);
+  return &kFunctions;
+}

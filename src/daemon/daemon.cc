@@ -1,0 +1,138 @@
+#include "daemon/daemon.h"
+
+#include <glib-unix.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <csignal>
+#include <cstdio>
+#include <string_view>
+
+#include "backends/backends.h"
+#include "base/glib-ptr.h"
+#include "base/log.h"
+#include "base/source.h"
+#include "daemon/paths.h"
+#include "daemon/privileges.h"
+#include "dbus/iocontrol-state.h"
+#include "hwdesc/hwdesc.h"
+#include "platform/kv-log.h"
+#include "port/ioport.h"
+#include "port/port-registry.h"
+#include "settings/param.h"
+
+namespace {
+
+struct Daemon {
+  GMainLoopPtr loop;
+  Source sigterm;
+  Source sighup;
+};
+
+// Both signals arrive as main-loop sources, so logging and quitting are safe here.
+gboolean on_sighup(gpointer /*user_data*/) {
+  log_info("Got SIGHUP");
+  return G_SOURCE_CONTINUE;
+}
+
+gboolean on_sigterm(gpointer user_data) {
+  log_info("Got SIGTERM");
+  g_main_loop_quit(static_cast<GMainLoop *>(user_data));
+  return G_SOURCE_CONTINUE;
+}
+
+void install_signal_sources(Daemon &daemon) {
+  // A log reader or a client that goes away must not take the daemon along.
+  (void)std::signal(SIGPIPE, SIG_IGN);
+  daemon.sigterm = Source(g_unix_signal_add(SIGTERM, on_sigterm, daemon.loop.get()));
+  daemon.sighup = Source(g_unix_signal_add(SIGHUP, on_sighup, nullptr));
+}
+
+void load_hardware_description() {
+  backends_register();
+  hwdesc_load_file(kHardwareDescription);
+  hwdesc_load_directory(kHardwareFragments);
+}
+
+void apply_settings() {
+  port_registry_for_each([](IOPort *ioport) { param_get_conf_vals(ioport); });
+  param_free_configuration();
+}
+
+bool legacy_export_present() {
+  return g_file_test(kLegacyExport, G_FILE_TEST_IS_REGULAR);
+}
+
+// Settings of an earlier version. Read before the settings file, which therefore wins.
+void merge_earlier_settings() {
+  if (legacy_export_present() && param_read_configuration(kEarlierSettings)) {
+    apply_settings();
+    unlink(kEarlierSettings);
+  }
+}
+
+bool read_settings() {
+  if (!param_read_configuration(kSettingsFile)) {
+    log_warning("Could not read configuration file\n");
+    return false;
+  }
+  apply_settings();
+  return true;
+}
+
+// Once before the settings are stored and, for a file that this start has made, once after: what
+// root leaves behind, the service account must be able to read and replace.
+void store_settings() {
+  const bool existed = access(kSettingsFile, F_OK) == 0;
+  if (existed) {
+    param_chown_to_service_user(kSettingsFile);
+  }
+  port_registry_assign_default_names();
+  param_save_all(kSettingsFile);
+  if (!existed && access(kSettingsFile, F_OK) == 0) {
+    param_chown_to_service_user(kSettingsFile);
+  }
+}
+
+// Everything that needs root. False: the settings file can't be read.
+bool bring_up_ports() {
+  load_hardware_description();
+  merge_earlier_settings();
+  if (!read_settings()) {
+    return false;
+  }
+  store_settings();
+  port_registry_setup_all();
+  return true;
+}
+
+// From here on as the service account.
+void go_public() {
+  iocontrol_state_start();
+  port_registry_arm_watches();
+  port_registry_declare_events();
+}
+
+void shut_down(Daemon &daemon) {
+  iocontrol_state_stop();
+  daemon.sigterm.reset();
+  daemon.sighup.reset();
+  port_registry_drop_all();
+}
+
+}  // namespace
+
+int daemon_run(int /*argc*/, char ** /*argv*/) {
+  kv_log_stdout();
+  Daemon daemon;
+  daemon.loop.reset(g_main_loop_new(nullptr, FALSE));
+  install_signal_sources(daemon);
+  if (!bring_up_ports()) {
+    return 1;
+  }
+  drop_privileges();
+  go_public();
+  g_main_loop_run(daemon.loop.get());
+  shut_down(daemon);
+  return 0;
+}

@@ -1,0 +1,327 @@
+#include "dbus/iocontrol-handlers.h"
+
+#include <optional>
+#include <string_view>
+
+#include "dbus/reannounce.h"
+#include "port/ioport.h"
+#include "port/port-error.h"
+#include "port/port-registry.h"
+#include "settings/param.h"
+
+namespace {
+
+gboolean fail(GDBusMethodInvocation *invocation, IOControlError code, const char *message) {
+  g_dbus_method_invocation_return_error_literal(invocation, io_control_error_quark(), code,
+                                                message);
+  return TRUE;
+}
+
+gboolean fail_no_port(GDBusMethodInvocation *invocation) {
+  return fail(invocation, IO_CONTROL_ERROR_NO_PORT, "No such port.");
+}
+
+// The port of the device that a client means by the number, or none.
+IOPortRef find_ioport(guint number) {
+  IOPortRef ioport = port_registry_find(number);
+  return io_port_is_ioport(ioport.get()) ? std::move(ioport) : nullptr;
+}
+
+void save(const IOPortRef &ioport) {
+  param_save_for_port(ioport.get(), kSettingsFile);
+}
+
+const char *active_word(bool activelow) {
+  return activelow ? "open" : "closed";
+}
+
+std::optional<bool> parse_word(std::string_view word, std::string_view yes, std::string_view no) {
+  if (word == yes) {
+    return true;
+  }
+  return word == no ? std::optional<bool>(false) : std::nullopt;
+}
+
+gboolean get_state(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
+                   gpointer /*user_data*/) {
+  const IOPortRef ioport = find_ioport(number);
+  if (!ioport) {
+    return fail_no_port(invocation);
+  }
+  iocontrol_state_complete_get_state(object, invocation, io_port_get_state(ioport.get()));
+  return TRUE;
+}
+
+gboolean set_state(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
+                   gboolean active, gpointer /*user_data*/) {
+  const IOPortRef ioport = find_ioport(number);
+  if (!ioport) {
+    return fail_no_port(invocation);
+  }
+  if (!io_port_set_state(ioport.get(), active)) {
+    return fail(invocation, IO_CONTROL_ERROR_NOT_OUTPUT, "Port not output.");
+  }
+  iocontrol_state_complete_set_state(object, invocation);
+  save(ioport);
+  return TRUE;
+}
+
+gboolean is_configurable(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
+                         gpointer /*user_data*/) {
+  const IOPortRef ioport = find_ioport(number);
+  if (!ioport) {
+    return fail_no_port(invocation);
+  }
+  iocontrol_state_complete_is_configurable(object, invocation,
+                                           io_port_get_type(ioport.get()) == PORT_CONFIGURABLE);
+  return TRUE;
+}
+
+gboolean get_direction(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
+                       gpointer /*user_data*/) {
+  const IOPortRef ioport = find_ioport(number);
+  if (!ioport) {
+    return fail_no_port(invocation);
+  }
+  iocontrol_state_complete_get_direction(object, invocation,
+                                         io_port_input(ioport.get()) ? "input" : "output");
+  return TRUE;
+}
+
+// Stores the settings whatever the outcome, as clients have come to rely on.
+gboolean set_direction(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
+                       const char *direction, gpointer /*user_data*/) {
+  const IOPortRef ioport = find_ioport(number);
+  if (!ioport) {
+    return fail_no_port(invocation);
+  }
+  const auto input = parse_word(direction, "input", "output");
+  if (!input) {
+    fail(invocation, IO_CONTROL_ERROR_GENERIC,
+         "Incorrect input to set_direction eiter use 'input' or 'output'");
+  } else if (io_port_set_direction(ioport.get(), *input)) {
+    iocontrol_state_complete_set_direction(object, invocation);
+  } else {
+    fail(invocation, IO_CONTROL_ERROR_NOT_CONFIGURABLE, "Port not configurable.");
+  }
+  save(ioport);
+  return TRUE;
+}
+
+gboolean get_active(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
+                    gpointer /*user_data*/) {
+  const IOPortRef ioport = find_ioport(number);
+  if (!ioport) {
+    return fail_no_port(invocation);
+  }
+  iocontrol_state_complete_get_active(object, invocation,
+                                      active_word(io_port_get_activelow(ioport.get(), true)),
+                                      active_word(io_port_get_activelow(ioport.get(), false)));
+  return TRUE;
+}
+
+// Stores the settings whatever the outcome, as clients have come to rely on.
+gboolean set_active(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
+                    gboolean input, const char *state, gpointer /*user_data*/) {
+  const IOPortRef ioport = find_ioport(number);
+  if (!ioport) {
+    return fail_no_port(invocation);
+  }
+  const auto activelow = parse_word(state, active_word(true), active_word(false));
+  if (!activelow) {
+    fail(invocation, IO_CONTROL_ERROR_GENERIC,
+         "Incorrect input to set_active eiter use 'open' or 'closed'");
+  } else if (io_port_set_activelow(ioport.get(), *activelow, input)) {
+    iocontrol_state_complete_set_active(object, invocation);
+  } else {
+    fail(invocation, IO_CONTROL_ERROR_GENERIC,
+         *activelow ? "Could not set port to open." : "Could not set port to closed.");
+  }
+  save(ioport);
+  return TRUE;
+}
+
+gboolean get_names(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
+                   gpointer /*user_data*/) {
+  const IOPortRef ioport = find_ioport(number);
+  if (!ioport) {
+    return fail_no_port(invocation);
+  }
+  std::optional<std::string> input;
+  std::optional<std::string> output;
+  io_port_get_names(ioport.get(), &input, &output);
+  iocontrol_state_complete_get_names(object, invocation, input.value_or("").c_str(),
+                                     output.value_or("").c_str());
+  return TRUE;
+}
+
+gboolean set_name(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
+                  gboolean input, const char *name, gpointer /*user_data*/) {
+  const IOPortRef ioport = find_ioport(number);
+  if (!ioport) {
+    return fail_no_port(invocation);
+  }
+  const auto set = input ? io_port_set_input_name : io_port_set_output_name;
+  if (!set(ioport.get(), name)) {
+    return fail(invocation, IO_CONTROL_ERROR_GENERIC,
+                input ? "Could not set input name for the port."
+                      : "Could not set output name for the port.");
+  }
+  iocontrol_state_complete_set_name(object, invocation);
+  save(ioport);
+  return TRUE;
+}
+
+// The one method that serves ports that are only virtual too: lookups find no others.
+gboolean set_virtual(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
+                     gboolean state, gpointer /*user_data*/) {
+  const IOPortRef ioport = port_registry_find(number);
+  if (!ioport) {
+    return fail_no_port(invocation);
+  }
+  if (!io_port_set_virtual(ioport.get(), state)) {
+    return fail(invocation, IO_CONTROL_ERROR_GENERIC, "Could not set port.");
+  }
+  iocontrol_state_complete_set_virtual(object, invocation);
+  save(ioport);
+  return TRUE;
+}
+
+ActionSequence parse_sequence(bool is_virtual, GVariant *steps) {
+  ActionSequence sequence = {is_virtual, {}};
+  GVariantIter iter;
+  gboolean state = FALSE;
+  gint32 time_ms = 0;
+  g_variant_iter_init(&iter, steps);
+  while (g_variant_iter_next(&iter, "(bi)", &state, &time_ms)) {
+    sequence.steps.push_back({state != FALSE, time_ms});
+  }
+  return sequence;
+}
+
+gboolean start_action_sequence(IOControlState *object, GDBusMethodInvocation *invocation,
+                               guint number, gboolean is_virtual, GVariant *steps,
+                               gpointer /*user_data*/) {
+  const IOPortRef ioport = port_registry_find(number);
+  if (!ioport) {
+    return fail_no_port(invocation);
+  }
+  ActionSequence sequence = parse_sequence(is_virtual, steps);
+  if (sequence.steps.empty()) {
+    return fail(invocation, IO_CONTROL_ERROR_GENERIC, "The sequence has no steps.");
+  }
+  if (io_port_is_busy(ioport.get())) {
+    return fail(invocation, IO_CONTROL_ERROR_BUSY, "The port is busy.");
+  }
+  if (!io_port_run_action_sequence(ioport.get(), std::move(sequence))) {
+    return fail(invocation, IO_CONTROL_ERROR_NOT_OUTPUT, "Port not output.");
+  }
+  iocontrol_state_complete_start_action_sequence(object, invocation);
+  return TRUE;
+}
+
+gboolean get_nbr_ports(IOControlState *object, GDBusMethodInvocation *invocation,
+                       gpointer /*user_data*/) {
+  iocontrol_state_complete_get_nbr_ports(object, invocation, port_registry_count_inputs(),
+                                         port_registry_count_outputs());
+  return TRUE;
+}
+
+GVariant *flags_to_variant(const IOPort *ioport) {
+  GVariantBuilder builder;
+  g_variant_builder_init(&builder, G_VARIANT_TYPE("a(sb)"));
+  for (const auto &[name, value] : io_port_get_flags(ioport)) {
+    g_variant_builder_add(&builder, "(sb)", name.c_str(), value);
+  }
+  return g_variant_builder_end(&builder);
+}
+
+GVariant *props_to_variant(IOPort *ioport) {
+  const bool input = io_port_direction_input(ioport);
+  return g_variant_new("(sibbbb@a(sb))", io_port_get_id(ioport).value_or("").c_str(),
+                       io_port_get_number(ioport), io_port_get_state(ioport), input,
+                       io_port_get_type(ioport) == PORT_CONFIGURABLE,
+                       io_port_get_activelow(ioport, input), flags_to_variant(ioport));
+}
+
+gboolean get_port_props(IOControlState *object, GDBusMethodInvocation *invocation,
+                        gpointer /*user_data*/) {
+  GVariantBuilder builder;
+  gint count = 0;
+  g_variant_builder_init(&builder, G_VARIANT_TYPE("a(sibbbba(sb))"));
+  {
+    const auto lock = port_registry_lock();
+    for (IOPort *ioport : port_registry_active_locked()) {
+      g_variant_builder_add_value(&builder, props_to_variant(ioport));
+      ++count;
+    }
+  }
+  iocontrol_state_complete_get_port_props(object, invocation, count,
+                                          g_variant_builder_end(&builder));
+  return TRUE;
+}
+
+bool drop_port(const char *id) {
+  const IOPortRef ioport = port_registry_get_by_id(id);
+  if (!ioport || !io_port_is_optional(ioport.get())) {
+    return false;
+  }
+  io_port_drop(ioport.get());
+  port_registry_park(ioport.get());
+  return true;
+}
+
+gboolean drop_io_ports(IOControlState *object, GDBusMethodInvocation *invocation,
+                       const char *const *ids, gpointer /*user_data*/) {
+  std::vector<const char *> dropped;
+  for (; *ids; ++ids) {
+    if (drop_port(*ids)) {
+      dropped.push_back(*ids);
+    }
+  }
+  if (!dropped.empty()) {
+    reannounce_ports();
+  }
+  dropped.push_back(nullptr);
+  iocontrol_state_complete_drop_ioports(object, invocation, dropped.data());
+  return TRUE;
+}
+
+gboolean refresh_io_ports(IOControlState *object, GDBusMethodInvocation *invocation,
+                          gpointer /*user_data*/) {
+  if (port_registry_retry_parked() > 0) {
+    reannounce_ports();
+  }
+  iocontrol_state_complete_refresh_ioports(object, invocation);
+  return TRUE;
+}
+
+struct Handler {
+  const char *signal;
+  GCallback callback;
+};
+
+}  // namespace
+
+void iocontrol_connect_handlers(IOControlState *object) {
+  const Handler handlers[] = {
+      {"handle-get-state", G_CALLBACK(get_state)},
+      {"handle-set-state", G_CALLBACK(set_state)},
+      {"handle-is-configurable", G_CALLBACK(is_configurable)},
+      {"handle-get-direction", G_CALLBACK(get_direction)},
+      {"handle-set-direction", G_CALLBACK(set_direction)},
+      {"handle-get-active", G_CALLBACK(get_active)},
+      {"handle-set-active", G_CALLBACK(set_active)},
+      {"handle-get-names", G_CALLBACK(get_names)},
+      {"handle-set-name", G_CALLBACK(set_name)},
+      {"handle-set-virtual", G_CALLBACK(set_virtual)},
+      {"handle-start-action-sequence", G_CALLBACK(start_action_sequence)},
+      {"handle-get-nbr-ports", G_CALLBACK(get_nbr_ports)},
+      {"handle-get-port-props", G_CALLBACK(get_port_props)},
+      {"handle-drop-ioports", G_CALLBACK(drop_io_ports)},
+      {"handle-refresh-ioports", G_CALLBACK(refresh_io_ports)},
+  };
+  for (const auto &handler : handlers) {
+    g_signal_connect(object, handler.signal, handler.callback, nullptr);
+  }
+}

@@ -1,0 +1,5 @@
+// Telling the rest of the device that ports have come or gone.
+#pragma once
+
+// Arms the watches and declares the events of every port in service anew. Main thread.
+void reannounce_ports();

@@ -1,0 +1,361 @@
+#include "hwdesc/hwdesc.h"
+
+#include <string_view>
+#include <vector>
+
+#include "backends/backends.h"
+#include "base/glib-ptr.h"
+#include "base/log.h"
+#include "hwdesc/hardware-id.h"
+#include "port/ioport.h"
+#include "port/port-registry.h"
+
+namespace {
+
+// Ports from this number on are given to virtual ones; a document that uses it by hand may collide.
+constexpr int kFirstVirtualPort = 6;
+constexpr int kDecimal = 10;
+
+struct Attribute {
+  std::string_view name;
+  const char *value;
+};
+using Attributes = std::vector<Attribute>;
+
+// What the parser remembers between the tags of one document.
+struct Loader {
+  bool skip_port = false;   // until the end tag of the port
+  bool in_backend = false;  // attributes go to the port's backend too
+  bool hardware_id_asked = false;
+  std::optional<std::string> hardware_id;
+};
+
+std::optional<int> first_virtual_input;
+
+bool is_true(const char *text) {
+  return g_ascii_strcasecmp(text, "true") == 0;
+}
+
+void set_if_boolean(bool &flag, const char *text) {
+  if (is_true(text)) {
+    flag = true;
+  } else if (g_ascii_strcasecmp(text, "false") == 0) {
+    flag = false;
+  }
+}
+
+// Not a number reads as 0; a number beyond 32 bits wraps.
+int parse_int(const char *text) {
+  return static_cast<int>(static_cast<guint32>(g_ascii_strtoll(text, nullptr, kDecimal)));
+}
+
+// --- The hardware filter ---
+
+// The service is asked once a document, also when it does not answer.
+const std::optional<std::string> &hardware_id(Loader &loader) {
+  if (!loader.hardware_id_asked) {
+    loader.hardware_id_asked = true;
+    loader.hardware_id = read_hardware_id("HWID");
+  }
+  return loader.hardware_id;
+}
+
+bool begins_with_any(const std::string &id, const char *prefixes) {
+  const GStrvPtr pieces(g_strsplit(prefixes, ":", -1));
+  for (char **piece = pieces.get(); *piece; ++piece) {
+    if (g_str_has_prefix(id.c_str(), *piece)) {
+      return true;
+    }
+  }
+  return false;
+}
+
+// A filter that can't be judged does not cost the device a port.
+bool fits_hardware(Loader &loader, const char *prefixes) {
+  const auto &id = hardware_id(loader);
+  if (!id || *prefixes == '\0') {
+    log_warning("Could not get the hardware id");
+    return true;
+  }
+  return begins_with_any(*id, prefixes);
+}
+
+// --- Elements ---
+
+// Makes the port, in place of an earlier one of the same name. False: it is for other hardware.
+bool open_port(Loader &loader, const Attributes &attributes) {
+  auto attribute = attributes.begin();
+  if (attribute != attributes.end() && attribute->name == "hwid") {
+    if (!fits_hardware(loader, attribute->value)) {
+      return false;
+    }
+    ++attribute;
+  }
+  if (attribute != attributes.end() && attribute->name == "name") {
+    port_registry_remove_by_id(attribute->value);
+  }
+  const IOPortRef ioport(io_port_new());
+  port_registry_add(ioport.get());
+  return true;
+}
+
+void apply_port(IOPort *ioport, const Attribute &attribute) {
+  if (attribute.name == "name") {
+    io_port_set_id(ioport, attribute.value);
+  } else if (attribute.name == "optional") {
+    io_port_set_optional(ioport, std::string_view(attribute.value) == "true");
+  }
+}
+
+void apply_port_type(IOPort *ioport, const Attribute &attribute) {
+  if (attribute.name != "type") {
+    return;
+  }
+  const std::string_view type = attribute.value;
+  if (type == "io_ctrl") {
+    io_port_set_type(ioport, PORT_CONFIGURABLE);
+    return;
+  }
+  if (type == "input") {
+    io_port_set_type(ioport, PORT_INPUT);
+  } else if (type == "output") {
+    io_port_set_type(ioport, PORT_OUTPUT);
+  } else {
+    log_critical("Unsupported port type %s\n", attribute.value);
+  }
+  io_port_restore_direction(ioport, io_port_direction_input(ioport));
+}
+
+void apply_properties(IOPort *ioport, const Attribute &attribute) {
+  io_port_set_flag(ioport, std::string(attribute.name), attribute.value);
+}
+
+void apply_port_no(IOPort *ioport, const Attribute &attribute) {
+  if (attribute.name != "nbr") {
+    return;
+  }
+  // The number that the port had until now is what counts: only giving a second one is odd.
+  if (io_port_get_number(ioport) >= kFirstVirtualPort) {
+    log_warning(
+        "You have a port with higher number than FIRST_VIRTUAL_PORT this might lead to unexpected "
+        "behaviour");
+  }
+  io_port_set_number(ioport, parse_int(attribute.value));
+}
+
+void apply_param_default_name(IOPort *ioport, const Attribute &attribute) {
+  if (attribute.name == "input" || attribute.name == "output") {
+    io_port_restore_name(ioport, attribute.value, attribute.name == "input");
+  }
+}
+
+void apply_backend(IOPort *ioport, const Attribute &attribute) {
+  if (attribute.name != "name") {
+    return;
+  }
+  if (const auto kind = backend_kind_from_word(attribute.value)) {
+    io_port_set_backend(ioport, *kind);
+  } else {
+    log_warning("Port %s: no backend is called %s", io_port_describe(ioport), attribute.value);
+  }
+}
+
+void apply_event(IOPort *ioport, const Attribute &attribute) {
+  IoEvent &event = io_port_events(ioport).front();
+  if (attribute.name == "declaration") {
+    event.name = attribute.value;
+  } else if (attribute.name == "input") {
+    set_if_boolean(event.input, attribute.value);
+  } else if (attribute.name == "output") {
+    set_if_boolean(event.output, attribute.value);
+  } else if (attribute.name == "supervised_input") {
+    set_if_boolean(event.supervised_input, attribute.value);
+  } else if (attribute.name == "declare_only") {
+    set_if_boolean(event.declare_only, attribute.value);
+  }
+}
+
+void apply_keyvalue(IOPort *ioport, const Attribute &attribute) {
+  auto &events = io_port_events(ioport);
+  if (events.empty() || events.front().keys.empty()) {
+    return;  // a key before any event; said when the element was opened
+  }
+  IoEventKey &key = events.front().keys.front();
+  if (attribute.name == "key") {
+    key.name = attribute.value;
+  } else if (attribute.name == "value") {
+    key.value = attribute.value;
+  } else if (attribute.name == "type") {
+    key.type = attribute.value;
+  } else if (attribute.name == "key-nice-name") {
+    key.key_nice_name = attribute.value;
+  } else if (attribute.name == "value-nice-name") {
+    key.value_nice_name = attribute.value;
+  } else if (attribute.name == "property") {
+    set_if_boolean(key.property, attribute.value);
+  }
+}
+
+void open_event(IOPort *ioport) {
+  io_port_events(ioport).emplace_front();
+}
+
+void open_keyvalue(IOPort *ioport) {
+  auto &events = io_port_events(ioport);
+  if (events.empty()) {
+    log_warning("Port %s: a key stands before any event", io_port_describe(ioport));
+    return;
+  }
+  events.front().keys.emplace_front();
+}
+
+struct Element {
+  std::string_view name;
+  void (*open)(IOPort *ioport);  // null: nothing is made
+  void (*apply)(IOPort *ioport, const Attribute &attribute);
+};
+
+constexpr Element kElements[] = {
+    {"port", nullptr, apply_port},
+    {"port_type", nullptr, apply_port_type},
+    {"properties", nullptr, apply_properties},
+    {"port_no", nullptr, apply_port_no},
+    {"param_default_name", nullptr, apply_param_default_name},
+    {"backend", nullptr, apply_backend},
+    {"event", open_event, apply_event},
+    {"keyvalue", open_keyvalue, apply_keyvalue},
+};
+
+const Element *find_element(std::string_view name) {
+  for (const auto &element : kElements) {
+    if (element.name == name) {
+      return &element;
+    }
+  }
+  return nullptr;
+}
+
+void apply_first_virtual_input(const Attributes &attributes) {
+  for (const auto &attribute : attributes) {
+    if (attribute.name == "nbr") {
+      first_virtual_input = parse_int(attribute.value);
+    }
+  }
+}
+
+// What follows the name of a backend, in the same tag already, is for that backend.
+bool names_backend(const Element *element, const Attribute &attribute) {
+  return element && element->apply == apply_backend && attribute.name == "name";
+}
+
+// Hands each attribute to the backend while its part of the document lasts, then to the port.
+void apply_element(Loader &loader, const char *name, const Element *element,
+                   const Attributes &attributes) {
+  const IOPortRef ioport = port_registry_nth(0);
+  if (!ioport) {
+    if (element) {
+      log_warning("Element %s stands before any port", name);
+    }
+    return;
+  }
+  if (element && element->open) {
+    element->open(ioport.get());
+  }
+  for (const auto &attribute : attributes) {
+    if (loader.in_backend) {
+      io_port_set_backend_property(ioport.get(), name, std::string(attribute.name).c_str(),
+                                   attribute.value);
+    }
+    if (element) {
+      element->apply(ioport.get(), attribute);
+    }
+    if (names_backend(element, attribute)) {
+      loader.in_backend = true;
+    }
+  }
+}
+
+// --- Tags ---
+
+void start_element(GMarkupParseContext * /*context*/, const gchar *name, const gchar **names,
+                   const gchar **values, gpointer user_data, GError ** /*error*/) {
+  auto &loader = *static_cast<Loader *>(user_data);
+  if (loader.skip_port) {
+    return;
+  }
+  Attributes attributes;
+  for (; *names; ++names, ++values) {
+    attributes.push_back({*names, *values});
+  }
+  const std::string_view element = name;
+  if (element == "port" && !open_port(loader, attributes)) {
+    loader.skip_port = true;
+    return;
+  }
+  if (element == "first_virtual_input") {
+    apply_first_virtual_input(attributes);
+  }
+  apply_element(loader, name, find_element(element), attributes);
+  if (element == "backend") {
+    loader.in_backend = true;
+  }
+}
+
+void end_element(GMarkupParseContext * /*context*/, const gchar *name, gpointer user_data,
+                 GError ** /*error*/) {
+  auto &loader = *static_cast<Loader *>(user_data);
+  const std::string_view element = name;
+  if (element == "backend") {
+    loader.in_backend = false;
+  } else if (element == "port") {
+    loader.skip_port = false;
+  }
+}
+
+constexpr GMarkupParser kParser = {start_element, end_element, nullptr, nullptr, nullptr};
+
+bool parse(std::string_view text) {
+  Loader loader;
+  const GMarkupContextPtr context(
+      g_markup_parse_context_new(&kParser, static_cast<GMarkupParseFlags>(0), &loader, nullptr));
+  Error error;
+  return g_markup_parse_context_parse(context.get(), text.data(), static_cast<gssize>(text.size()),
+                                      error.out()) &&
+         g_markup_parse_context_end_parse(context.get(), error.out());
+}
+
+}  // namespace
+
+bool hwdesc_load_file(const std::string &path) {
+  char *contents = nullptr;
+  gsize length = 0;
+  if (!g_file_get_contents(path.c_str(), &contents, &length, nullptr)) {
+    log_critical("Couldn't load XML (%s)\n", path.c_str());
+    return false;
+  }
+  const GCharPtr text(contents);
+  if (!parse({contents, length})) {
+    log_critical("Couldn't parse markup file (%s)\n", path.c_str());
+    return false;
+  }
+  return true;
+}
+
+void hwdesc_load_directory(const std::string &path) {
+  if (!g_file_test(path.c_str(), G_FILE_TEST_IS_DIR)) {
+    return;
+  }
+  const GDirPtr directory(g_dir_open(path.c_str(), 0, nullptr));
+  if (!directory) {
+    return;
+  }
+  while (const char *name = g_dir_read_name(directory.get())) {
+    if (!hwdesc_load_file(path + "/" + name)) {
+      return;
+    }
+  }
+}
+
+std::optional<int> hwdesc_first_virtual_input() {
+  return first_virtual_input;
+}

@@ -1,0 +1,24 @@
+// The device's configuration utilities library.
+#pragma once
+
+#include <glib.h>
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+// Replaces the contents of the file `path` by `length` bytes of `data` (-1: up to the terminating
+// zero) and syncs file and directory to storage. Whoever reads the file, at whatever moment and
+// after whatever crash, finds the old or the new contents, whole. The owner and the mode of a
+// replaced file are kept as far as the caller may set them; a new file gets mode 0644, so that a
+// file that is written before privileges are dropped can be read after.
+//
+// Returns FALSE and sets `error` (domain G_FILE_ERROR) when the new contents could not be stored;
+// the old file is then untouched and nothing is left beside it (only when syncing the directory
+// failed are the new contents in place already). Callable from any thread.
+gboolean confutils_set_file_contents_with_sync(const gchar *path, const gchar *data, gssize length,
+                                               GError **error);
+
+#ifdef __cplusplus
+}
+#endif

@@ -1,0 +1,163 @@
+// Action sequences: timed lists of states on a thread of their own, and how they are stopped.
+//
+// A sequence counts as running from before its thread starts until after its end was announced, so
+// that there is no moment at which a cancel could be lost. The thread gives up the port's lock for
+// each wait and waits on the sequence lock, under which a cancel is asked for: no wake-up is lost.
+#include "base/glib-ptr.h"
+#include "base/log.h"
+#include "port/ioport-private.h"
+#include "port/port-listener.h"
+
+namespace {
+
+constexpr const char *kThreadName = "Action thread";
+
+struct ActionJob {
+  IOPortRef port;
+  ActionSequence sequence;
+};
+
+// The action threads of all ports, counted until they no longer touch any port.
+std::mutex threads_lock;
+MonotonicCondition threads_gone;
+int threads_alive = 0;
+
+void thread_begins() {
+  const std::lock_guard lock(threads_lock);
+  ++threads_alive;
+}
+
+void thread_ends() {
+  const std::lock_guard lock(threads_lock);
+  --threads_alive;
+  threads_gone.notify_all();
+}
+
+bool can_run(const IOPort *ioport, const ActionSequence &sequence) {
+  const bool may_drive = !io_port_input(ioport) && ioport->backend != kVirtualBackend;
+  return !sequence.steps.empty() && (sequence.is_virtual || may_drive) && ioport->set_up;
+}
+
+bool claim(IOPort *ioport) {
+  const std::lock_guard lock(ioport->sequence_lock);
+  if (ioport->sequence_running) {
+    return false;
+  }
+  ioport->sequence_running = true;
+  ioport->cancel_sequence = false;
+  return true;
+}
+
+// The product wraps in 32 bits: times above 2,147,483 ms have always behaved that way.
+std::int64_t deadline_after(std::int32_t time_ms) {
+  const auto wrapped = static_cast<std::int32_t>(static_cast<std::uint32_t>(time_ms) * 1000U);
+  return g_get_monotonic_time() + wrapped;
+}
+
+// Holds the step's state for its time. False: the sequence is cancelled.
+bool hold(IOPort *ioport, std::int32_t time_ms) {
+  const std::int64_t deadline = deadline_after(time_ms);
+  std::unique_lock lock(ioport->sequence_lock);
+  while (!ioport->cancel_sequence && g_get_monotonic_time() < deadline) {
+    ioport->sequence_cond.wait_until(lock, deadline);
+  }
+  return !ioport->cancel_sequence;
+}
+
+void take_step(IOPort *ioport, bool is_virtual, bool state) {
+  const std::lock_guard lock(ioport->lock);
+  if (is_virtual) {
+    io_port_set_virtual(ioport, state);
+  } else {
+    io_port_set_state_internal(ioport, state);
+  }
+}
+
+void release(IOPort *ioport) {
+  const std::lock_guard lock(ioport->sequence_lock);
+  ioport->cancel_sequence = false;
+  ioport->sequence_running = false;
+  ioport->sequence_done_cond.notify_all();
+}
+
+void announce_end(IOPort *ioport) {
+  if (const auto done = port_listener().action_sequence_done) {
+    done(ioport->number);
+  }
+}
+
+void run_steps(IOPort *ioport, const ActionSequence &sequence) {
+  for (const auto &step : sequence.steps) {
+    take_step(ioport, sequence.is_virtual, step.state);
+    if (!hold(ioport, step.time_ms)) {
+      return;
+    }
+  }
+}
+
+gpointer run_sequence(gpointer data) {
+  {
+    const std::unique_ptr<ActionJob> job(static_cast<ActionJob *>(data));
+    run_steps(job->port.get(), job->sequence);
+    announce_end(job->port.get());
+    release(job->port.get());
+  }
+  thread_ends();
+  return nullptr;
+}
+
+bool start_thread(IOPort *ioport, ActionSequence sequence) {
+  io_port_ref(ioport);
+  auto job = std::make_unique<ActionJob>(ActionJob{IOPortRef(ioport), std::move(sequence)});
+  thread_begins();
+  Error error;
+  GThread *thread = g_thread_try_new(kThreadName, run_sequence, job.get(), error.out());
+  if (!thread) {
+    log_warning("Could not start action thread: %s", error.message());
+    thread_ends();
+    release(ioport);
+    return false;
+  }
+  (void)job.release();  // the thread owns it
+  g_thread_unref(thread);
+  return true;
+}
+
+}  // namespace
+
+bool io_port_run_action_sequence(IOPort *ioport, ActionSequence sequence) {
+  g_assert(ioport);
+  if (!can_run(ioport, sequence) || !claim(ioport)) {
+    log_warning("Set action seq on incorrect port");
+    return false;
+  }
+  return start_thread(ioport, std::move(sequence));
+}
+
+bool io_port_is_busy(IOPort *ioport) {
+  {
+    const std::lock_guard lock(ioport->sequence_lock);
+    if (ioport->sequence_running) {
+      return true;
+    }
+  }
+  const std::unique_lock lock(ioport->lock, std::try_to_lock);
+  return !lock.owns_lock();
+}
+
+std::unique_lock<std::mutex> io_port_stop_sequence_and_lock(IOPort *ioport) {
+  std::unique_lock sequence(ioport->sequence_lock);
+  ioport->cancel_sequence = true;
+  while (ioport->sequence_running) {
+    ioport->sequence_cond.notify_all();
+    ioport->sequence_done_cond.wait(sequence);
+  }
+  return std::unique_lock(ioport->lock);
+}
+
+void io_port_wait_for_action_threads() {
+  std::unique_lock lock(threads_lock);
+  while (threads_alive > 0) {
+    threads_gone.wait(lock);
+  }
+}

@@ -1,0 +1,119 @@
+// Supervision of a port: forwarders to the backend, and the one rule that all backends share for
+// changing a range.
+#include <algorithm>
+
+#include "base/glib-ptr.h"
+#include "base/log.h"
+#include "port/ioport-private.h"
+#include "port/port-error.h"
+
+namespace {
+
+constexpr std::int32_t kLevelLimit = 65536;
+
+// A limit of 2^31 and more counts as negative. Clients rely on that.
+bool valid_limits(std::uint32_t lower, std::uint32_t upper) {
+  const auto low = static_cast<std::int32_t>(lower);
+  const auto high = static_cast<std::int32_t>(upper);
+  return low < kLevelLimit && high < kLevelLimit && low < high;
+}
+
+}  // namespace
+
+bool io_port_is_supervisable(IOPort *port) {
+  g_assert_nonnull(port);
+  g_assert_nonnull(port->functions);
+  return port->functions->is_supervisable && port->functions->is_supervisable(port);
+}
+
+bool io_port_set_supervised(IOPort *port, bool supervised) {
+  g_assert_nonnull(port->functions);
+  if (!io_port_is_supervisable(port)) {
+    return false;
+  }
+  port->supervised = supervised;
+  if (port->functions->set_supervised) {
+    port->functions->set_supervised(port, supervised);
+  }
+  if (io_port_input(port)) {
+    io_port_set_direction(port, true);
+  }
+  return true;
+}
+
+bool io_port_get_supervised_ranges(IOPort *port, SupervisedRanges *ranges) {
+  g_assert_nonnull(port->functions);
+  g_assert_nonnull(ranges);
+  if (!io_port_is_supervisable(port) || !port->functions->get_supervised_ranges) {
+    return false;
+  }
+  *ranges = port->functions->get_supervised_ranges(port);
+  return true;
+}
+
+bool io_port_set_supervised_ranges(IOPort *port, SupervisedRanges ranges, GError **error) {
+  g_assert_nonnull(port->functions);
+  return io_port_is_supervisable(port) && port->functions->set_supervised_ranges &&
+         port->functions->set_supervised_ranges(port, std::move(ranges), error);
+}
+
+bool io_port_set_supervised_range(IOPort *ioport, const char *state_word, std::uint32_t lower,
+                                  std::uint32_t upper, GError **error) {
+  if (!valid_limits(lower, upper)) {
+    g_set_error_literal(error, io_supervised_error_quark(), IO_SUPERVISED_ERROR_BAD_RANGE,
+                        "Invalid range.");
+    return false;
+  }
+  const auto state = supervised_range_string2state(state_word);
+  if (state == SUPERVISED_STATE_UNDEFINED) {
+    g_set_error_literal(error, io_supervised_error_quark(), IO_SUPERVISED_ERROR_BAD_RANGE,
+                        "State is undefined.");
+    return false;
+  }
+  SupervisedRanges ranges;
+  if (!io_port_get_supervised_ranges(ioport, &ranges)) {
+    g_set_error_literal(error, io_supervised_error_quark(), IO_SUPERVISED_ERROR_GENERIC,
+                        "Failed to get ranges from port.");
+    return false;
+  }
+  const auto same = std::find_if(ranges.begin(), ranges.end(),
+                                 [&](const auto &range) { return range.state == state; });
+  if (same != ranges.end()) {
+    ranges.erase(same);
+  }
+  ranges.push_back({state, upper, lower});
+  return io_port_set_supervised_ranges(ioport, std::move(ranges), error);
+}
+
+bool io_port_get_supervised_readout(IOPort *port, SupervisedRangeState *state, std::uint32_t *level,
+                                    GError **error) {
+  g_assert_nonnull(port->functions);
+  g_assert_nonnull(state);
+  g_assert_nonnull(level);
+  if (!port->functions->get_supervised_readout) {
+    g_set_error_literal(error, io_control_error_quark(), IO_CONTROL_ERROR_GENERIC,
+                        "Not applicable for port.");
+    return false;
+  }
+  if (!io_port_is_supervisable(port)) {
+    g_set_error_literal(error, io_supervised_error_quark(), IO_SUPERVISED_ERROR_NOT_SUPERVISED,
+                        "Port is non-supervised");
+    return false;
+  }
+  return port->functions->get_supervised_readout(port, state, level, error);
+}
+
+SupervisedRangeState io_port_get_supervised_state(IOPort *ioport) {
+  g_assert(ioport);
+  if (!ioport->set_up || !io_port_is_supervisable(ioport)) {
+    return SUPERVISED_STATE_OPEN;
+  }
+  SupervisedRangeState state = SUPERVISED_STATE_UNDEFINED;
+  std::uint32_t level = 0;
+  Error error;
+  if (!io_port_get_supervised_readout(ioport, &state, &level, error.out())) {
+    log_warning("Failed to read supervised state: %s.", error.message());
+    return SUPERVISED_STATE_UNDEFINED;
+  }
+  return state;
+}

@@ -1,0 +1,232 @@
+// The port object: one digital input, output, configurable or virtual port. Nobody but the port
+// layer sees its fields; the operations below apply the active-low sense, keep the port's lock,
+// forward to the backend and report changes through the port listener.
+//
+// Unless an operation says otherwise: it runs on the main thread, a null port is a programming
+// error that ends the daemon, and it reports nothing but its result.
+#pragma once
+
+#include <glib.h>
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "port/io-event.h"
+#include "port/port-functions.h"
+#include "port/supervised-range.h"
+
+enum PortType {
+  PORT_INPUT = 0,
+  PORT_OUTPUT = 1,
+  PORT_CONFIGURABLE = 2,  // input or output, by the port's direction
+};
+
+enum ButtonType { BUTTON_NONE = 0, BUTTON_PULSE = 1, BUTTON_ACTINACT = 2 };
+enum PortMode { PORT_MODE_MONOSTABLE = 1, PORT_MODE_BISTABLE = 2 };
+
+struct IOPort;
+
+// --- Lifetime -----------------------------------------------------------------------------------
+
+// A new port with one reference, the caller's.
+IOPort *io_port_new();
+// Any thread; null is ignored.
+void io_port_ref(IOPort *ioport);
+// Any thread; null is ignored. The last reference stops a running sequence and frees the port.
+void io_port_unref(IOPort *ioport);
+
+struct IOPortUnref {
+  void operator()(IOPort *ioport) const { io_port_unref(ioport); }
+};
+using IOPortRef = std::unique_ptr<IOPort, IOPortUnref>;
+
+// --- Backend ------------------------------------------------------------------------------------
+
+// Makes the backend's table known, with the operation that installs it: that gives the port its
+// private record if it has none. Kinds outside 0 to 9 are ignored.
+using MakePortFunctions = const PortFunctions *(*)(IOPort *port);
+void io_port_register_backend(int kind, MakePortFunctions make);
+// Chooses the backend. A kind that nobody registered leaves the port without a table.
+void io_port_set_backend(IOPort *ioport, int kind);
+int io_port_get_backend(const IOPort *ioport);
+// Whether the port has a table. The operations that say "needs a backend" may be called only then.
+bool io_port_has_backend(const IOPort *ioport);
+// Hands an attribute of the hardware description to the backend. Without a backend it is lost, with
+// a warning.
+void io_port_set_backend_property(IOPort *ioport, const char *section, const char *key,
+                                  const char *value);
+// The backend's private record. Any thread that may call the backend.
+PortBackendData *io_port_backend_data(const IOPort *ioport);
+void io_port_set_backend_data(IOPort *ioport, std::unique_ptr<PortBackendData> data);
+
+// Gives the port a record of the backend's type if it has none, and returns it.
+template <typename Data>
+Data *io_port_make_backend_data(IOPort *ioport) {
+  if (!io_port_backend_data(ioport)) {
+    io_port_set_backend_data(ioport, std::make_unique<Data>());
+  }
+  return static_cast<Data *>(io_port_backend_data(ioport));
+}
+
+// Brings the backend up; needs a backend. A port that was dropped gets a fresh backend first, with
+// the attributes of the hardware description.
+bool io_port_setup(IOPort *ioport);
+bool io_port_is_set_up(const IOPort *ioport);
+// Takes the port out of service: ends a running sequence and lets the backend release what it
+// holds. The port reads 0 and refuses to be driven until it is set up again.
+void io_port_drop(IOPort *ioport);
+
+// --- Identity, flags and legacy settings --------------------------------------------------------
+
+PortType io_port_get_type(const IOPort *ioport);
+void io_port_set_type(IOPort *ioport, PortType type);
+// The identifier in the hardware description; unset until given.
+const std::optional<std::string> &io_port_get_id(const IOPort *ioport);
+void io_port_set_id(IOPort *ioport, std::string id);
+// The identifier for a message: never null.
+const char *io_port_describe(const IOPort *ioport);
+int io_port_get_number(const IOPort *ioport);
+void io_port_set_number(IOPort *ioport, int number);
+bool io_port_is_optional(const IOPort *ioport);
+void io_port_set_optional(IOPort *ioport, bool optional);
+
+// Sets a flag: true when the text is "true" in any letter case.
+void io_port_set_flag(IOPort *ioport, const std::string &name, const char *text);
+// False when the flag is absent or the port has no backend.
+bool io_port_get_flag(const IOPort *ioport, const char *name);
+// Unset when the flag is absent.
+std::optional<bool> io_port_lookup_flag(const IOPort *ioport, const char *name);
+// All flags, by name.
+std::vector<std::pair<std::string, bool>> io_port_get_flags(const IOPort *ioport);
+// Whether the port is one of the device's own, visible on the control interface. Null gives false.
+bool io_port_is_ioport(const IOPort *ioport);
+
+// Accepts PORT_MODE_MONOSTABLE and PORT_MODE_BISTABLE; false: refused.
+bool io_port_set_mode(IOPort *ioport, int mode);
+int io_port_get_mode(const IOPort *ioport);  // null gives 0
+void io_port_set_delay_time(IOPort *ioport, std::int32_t delay_time);
+std::int32_t io_port_get_delay_time(const IOPort *ioport);  // null gives -1
+void io_port_set_pulse_time(IOPort *ioport, std::uint32_t pulse_time);
+std::uint32_t io_port_get_pulse_time(const IOPort *ioport);
+void io_port_set_button(IOPort *ioport, int button);
+int io_port_get_button(const IOPort *ioport);
+void io_port_set_spare_setting(IOPort *ioport, std::uint32_t value);  // 0 is ignored
+std::uint32_t io_port_get_spare_setting(const IOPort *ioport);        // null gives 0
+
+// --- Role ---------------------------------------------------------------------------------------
+
+// Whether the port acts as an input now. Needs a backend. Any thread.
+bool io_port_input(const IOPort *ioport);
+// The same from the type and the direction alone, so for a port without backend too. Any thread.
+bool io_port_direction_input(const IOPort *ioport);
+// Whether the port acts as an input whose supervision is on. Needs a backend. Any thread.
+bool io_port_supervised_input(const IOPort *ioport);
+bool io_port_is_supervised(const IOPort *ioport);
+// The active-low flag of the input or the output side. Any thread.
+bool io_port_get_activelow(const IOPort *ioport, bool input);
+// Whether the port's lock is taken or a sequence runs. Never waits.
+bool io_port_is_busy(IOPort *ioport);
+
+// --- State --------------------------------------------------------------------------------------
+
+// The logical state; false before set-up and while the level is unknown. Any thread.
+bool io_port_get_state(IOPort *ioport);
+// Drives an output. False, with a warning, for a port that acts as an input, is on the virtual
+// backend or is not set up.
+bool io_port_set_state(IOPort *ioport, bool state);
+// The same without the checks. The caller holds the port's lock. Any thread.
+void io_port_set_state_internal(IOPort *ioport, bool state);
+// Reports a state without touching hardware; on a virtual output also stores it. Always true. Any
+// thread.
+bool io_port_set_virtual(IOPort *ioport, bool state);
+// What a backend's watch calls: sends the events for the state and PortChanged. A supervised input
+// reports its line state; whatever is not 0 counts as active.
+void io_port_report_state(IOPort *ioport, std::int32_t state);
+// Emits PortChanged while the port's events are enabled. Any thread.
+void io_port_send_signal(IOPort *ioport, bool virtual_change, bool state);
+// Arms the backend's watch while the port acts as an input and its events are enabled. Needs a
+// backend.
+void io_port_set_watch(IOPort *ioport);
+
+// --- Names --------------------------------------------------------------------------------------
+
+// The name of the role in use. Null gives a critical message and no name.
+std::optional<std::string> io_port_get_name(const IOPort *ioport);
+// The names that apply to the port's type; the others are left alone. Null does nothing.
+void io_port_get_names(const IOPort *ioport, std::optional<std::string> *input_name,
+                       std::optional<std::string> *output_name);
+// False for a null port and for a port type without that side. A changed name in use makes the
+// port's events known anew.
+bool io_port_set_input_name(IOPort *ioport, const std::string &name);
+bool io_port_set_output_name(IOPort *ioport, const std::string &name);
+
+// --- Stored settings, put in place without any report or backend call ---------------------------
+
+void io_port_restore_direction(IOPort *ioport, bool input);
+void io_port_restore_activelow(IOPort *ioport, bool activelow, bool input);
+void io_port_restore_name(IOPort *ioport, std::optional<std::string> name, bool input);
+void io_port_restore_supervised(IOPort *ioport, bool supervised);
+
+// --- Settings changes (they end a running sequence) ---------------------------------------------
+
+// Changing an output's sense flips the line and keeps the logical state; changing an input's
+// reports the state anew. False for a port type without that side.
+bool io_port_set_activelow(IOPort *ioport, bool activelow, bool input);
+// False unless the port is configurable.
+bool io_port_set_direction(IOPort *ioport, bool input);
+
+// --- Supervision (needs a backend) --------------------------------------------------------------
+
+bool io_port_is_supervisable(IOPort *ioport);
+// False unless the port is supervisable.
+bool io_port_set_supervised(IOPort *ioport, bool supervised);
+// Copies the port's ranges; false unless the port is supervisable.
+bool io_port_get_supervised_ranges(IOPort *ioport, SupervisedRanges *ranges);
+// False, at times without an error, when they were refused.
+bool io_port_set_supervised_ranges(IOPort *ioport, SupervisedRanges ranges, GError **error);
+// Adds the range of one state or replaces it, the new one going to the end of the list. Limits are
+// read as signed 32-bit numbers. False and `error` when the range is refused.
+bool io_port_set_supervised_range(IOPort *ioport, const char *state, std::uint32_t lower,
+                                  std::uint32_t upper, GError **error);
+bool io_port_get_supervised_readout(IOPort *ioport, SupervisedRangeState *state,
+                                    std::uint32_t *level, GError **error);
+// The state of the line: undefined when the readout fails, open (0) for a port that is not set up
+// or not supervisable.
+SupervisedRangeState io_port_get_supervised_state(IOPort *ioport);
+
+// --- Events -------------------------------------------------------------------------------------
+
+// The port's events, newest first, for whoever declares and fills them.
+IoEvents &io_port_events(IOPort *ioport);
+// Whether the event is for the role that the port has now. Any thread.
+bool io_port_event_applies(const IOPort *ioport, const IoEvent &event);
+bool io_port_events_enabled(const IOPort *ioport);  // any thread
+// Off: withdraws every event and keeps the port silent. On: declares them.
+void io_port_set_events_enabled(IOPort *ioport, bool enabled);
+// Declares every event of the port; needs a backend. What can't be declared is logged.
+void io_port_declare_events(IOPort *ioport);
+void io_port_reset_event_filters(IOPort *ioport);
+// Whether one of the port's events is the shared any-port event. False while events are off.
+bool io_port_got_port_any(IOPort *ioport);
+
+// --- Action sequences ---------------------------------------------------------------------------
+
+struct ActionStep {
+  bool state;
+  std::int32_t time_ms;  // how long the state is held before the next step; below 1: not at all
+};
+
+struct ActionSequence {
+  bool is_virtual;  // reports the states instead of driving the port
+  std::vector<ActionStep> steps;
+};
+
+// Starts the sequence on a thread of its own, which takes a reference on the port. False, with a
+// warning, when the port can't run it, or when a sequence runs on it already.
+bool io_port_run_action_sequence(IOPort *ioport, ActionSequence sequence);
+// Waits until no action thread of any port is left. Cancel the sequences first.
+void io_port_wait_for_action_threads();

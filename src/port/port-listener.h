@@ -1,0 +1,36 @@
+// What the port layer tells the world above it. The event code and the D-Bus interfaces fill their
+// slots at start-up; an empty slot means "not up yet" and is skipped without a word.
+#pragma once
+
+#include <cstdint>
+
+struct IOPort;
+struct IoEvent;
+
+struct PortChange {
+  int number;
+  bool is_virtual;
+  bool hidden;
+  bool input;
+  bool virtual_trig;
+  bool state;
+  bool activelow;
+};
+
+struct PortListener {
+  // Declares the event if it applies to the port now and is not declared yet; false: it could not.
+  bool (*declare_event)(IOPort *port, IoEvent *event) = nullptr;
+  void (*undeclare_event)(IoEvent *event) = nullptr;
+  // Withdraws the declaration and makes it anew, since what it says of the port has changed.
+  void (*redeclare_event)(IOPort *port, IoEvent *event) = nullptr;
+  // Sends the event for a state: the logical state, or the line state of a supervised input. Also
+  // from action threads.
+  void (*send_event)(IOPort *port, IoEvent *event, std::int32_t state) = nullptr;
+  // Also from action threads.
+  void (*port_changed)(const PortChange &change) = nullptr;
+  void (*action_sequence_done)(int number) = nullptr;
+};
+
+// The one table of the process. Fill slots before the first port is set up and leave them: action
+// threads read them without a lock.
+PortListener &port_listener();

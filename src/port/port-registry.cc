@@ -1,0 +1,264 @@
+#include "port/port-registry.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "base/log.h"
+#include "port/ioport-private.h"
+
+namespace {
+
+using Ports = std::vector<IOPort *>;
+
+struct Registry {
+  std::mutex lock;
+  Ports active;
+  Ports parked;
+};
+
+Registry &registry() {
+  static Registry instance;
+  return instance;
+}
+
+IOPortRef new_reference(IOPort *ioport) {
+  io_port_ref(ioport);
+  return IOPortRef(ioport);
+}
+
+bool takes_part(const IOPort *ioport) {
+  return io_port_is_ioport(ioport) || io_port_get_flag(ioport, "virtual");
+}
+
+IOPortRef find_in(const Ports &ports, std::uint32_t number) {
+  const auto found = std::find_if(ports.rbegin(), ports.rend(), [&](const IOPort *ioport) {
+    return std::cmp_equal(ioport->number, number) && takes_part(ioport);
+  });
+  return found == ports.rend() ? nullptr : new_reference(*found);
+}
+
+void put_in_front(Ports &ports, IOPort *ioport) {
+  ports.insert(ports.begin(), ioport);
+}
+
+std::uint32_t count_role(bool input) {
+  const std::lock_guard lock(registry().lock);
+  const auto &ports = registry().active;
+  return static_cast<std::uint32_t>(
+      std::count_if(ports.begin(), ports.end(), [&](const IOPort *ioport) {
+        return io_port_is_ioport(ioport) && io_port_direction_input(ioport) == input;
+      }));
+}
+
+// A document may declare a port without a backend, or name one that does not exist. Such a port is
+// kept, so that it can be listed, but it never comes into service.
+bool set_up(IOPort *ioport) {
+  if (!io_port_has_backend(ioport)) {
+    log_warning("Port %s has no backend and stays out of service", io_port_describe(ioport));
+    return false;
+  }
+  return io_port_setup(ioport);
+}
+
+// Moves the ports of `from` that satisfy `moves` to the front of `to`, first to last.
+template <typename Predicate>
+std::size_t move_ports(Ports &from, Ports &to, Predicate moves) {
+  Ports stay;
+  std::size_t moved = 0;
+  for (IOPort *ioport : std::exchange(from, {})) {
+    if (moves(ioport)) {
+      put_in_front(to, ioport);
+      ++moved;
+    } else {
+      stay.push_back(ioport);
+    }
+  }
+  from = std::move(stay);
+  return moved;
+}
+
+// References to the ports in service, for passes that must not hold the lock.
+std::vector<IOPortRef> snapshot() {
+  const std::lock_guard lock(registry().lock);
+  std::vector<IOPortRef> ports;
+  for (IOPort *ioport : registry().active) {
+    if (io_port_has_backend(ioport)) {
+      ports.push_back(new_reference(ioport));
+    }
+  }
+  return ports;
+}
+
+std::string default_input_name(const IOPort *ioport, int inputs_seen) {
+  return ioport->id == "pir_detector" ? "PIR sensor" : "Input " + std::to_string(inputs_seen);
+}
+
+struct NameCounters {
+  int inputs = 0;
+  int outputs = 0;
+};
+
+void assign_default_name(IOPort *ioport, NameCounters &seen) {
+  if (ioport->type != PORT_OUTPUT) {
+    ++seen.inputs;
+    if (!ioport->input_name) {
+      ioport->input_name = default_input_name(ioport, seen.inputs);
+    }
+  }
+  if (ioport->type != PORT_INPUT) {
+    ++seen.outputs;
+    if (!ioport->output_name) {
+      ioport->output_name = "Output " + std::to_string(seen.outputs);
+    }
+  }
+}
+
+}  // namespace
+
+void port_registry_add(IOPort *ioport) {
+  const std::lock_guard lock(registry().lock);
+  io_port_ref(ioport);
+  put_in_front(registry().active, ioport);
+}
+
+IOPortRef port_registry_nth(std::size_t n) {
+  const std::lock_guard lock(registry().lock);
+  const auto &ports = registry().active;
+  return n < ports.size() ? new_reference(ports[n]) : nullptr;
+}
+
+IOPortRef port_registry_find(std::uint32_t number) {
+  const std::lock_guard lock(registry().lock);
+  return find_in(registry().active, number);
+}
+
+IOPortRef port_registry_find_parked(std::uint32_t number) {
+  const std::lock_guard lock(registry().lock);
+  return find_in(registry().parked, number);
+}
+
+IOPort *port_registry_find_by_id_locked(const std::string &id) {
+  const auto &ports = registry().active;
+  const auto found = std::find_if(ports.begin(), ports.end(),
+                                  [&](const IOPort *ioport) { return ioport->id == id; });
+  return found == ports.end() ? nullptr : *found;
+}
+
+IOPortRef port_registry_get_by_id(const std::string &id) {
+  const std::lock_guard lock(registry().lock);
+  return new_reference(port_registry_find_by_id_locked(id));
+}
+
+void port_registry_remove_by_id(const std::string &id) {
+  IOPortRef removed;  // released after the lock: freeing a port withdraws its events
+  const std::lock_guard lock(registry().lock);
+  removed.reset(port_registry_find_by_id_locked(id));
+  if (removed) {
+    std::erase(registry().active, removed.get());
+  }
+}
+
+std::size_t port_registry_count() {
+  const std::lock_guard lock(registry().lock);
+  return registry().active.size();
+}
+
+std::uint32_t port_registry_count_outputs() {
+  return count_role(false);
+}
+
+std::uint32_t port_registry_count_inputs() {
+  return count_role(true);
+}
+
+std::vector<std::uint32_t> port_registry_supervisable_numbers() {
+  std::vector<std::uint32_t> numbers;
+  port_registry_for_each([&](IOPort *ioport) {
+    if (io_port_is_supervisable(ioport)) {
+      numbers.push_back(static_cast<std::uint32_t>(ioport->number));
+    }
+  });
+  return numbers;
+}
+
+bool port_registry_any_port_active() {
+  const std::lock_guard lock(registry().lock);
+  const auto &ports = registry().active;
+  return std::any_of(ports.begin(), ports.end(), [](IOPort *ioport) {
+    return io_port_got_port_any(ioport) && io_port_get_state(ioport);
+  });
+}
+
+void port_registry_for_each(const std::function<void(IOPort *)> &visit) {
+  const std::lock_guard lock(registry().lock);
+  for (IOPort *ioport : registry().active) {
+    if (io_port_has_backend(ioport)) {
+      visit(ioport);
+    }
+  }
+}
+
+void port_registry_assign_default_names() {
+  NameCounters seen;
+  for (std::uint32_t number = 0; number < port_registry_count(); ++number) {
+    if (const IOPortRef ioport = port_registry_find(number)) {
+      assign_default_name(ioport.get(), seen);
+    }
+  }
+}
+
+void port_registry_setup_all() {
+  const std::lock_guard lock(registry().lock);
+  move_ports(registry().active, registry().parked,
+             [](IOPort *ioport) { return !set_up(ioport) && ioport->optional; });
+}
+
+std::size_t port_registry_retry_parked() {
+  const std::lock_guard lock(registry().lock);
+  return move_ports(registry().parked, registry().active, set_up);
+}
+
+void port_registry_park(IOPort *ioport) {
+  const std::lock_guard lock(registry().lock);
+  if (ioport->optional && std::erase(registry().active, ioport) > 0) {
+    put_in_front(registry().parked, ioport);
+  }
+}
+
+void port_registry_arm_watches() {
+  for (const auto &ioport : snapshot()) {
+    io_port_set_watch(ioport.get());
+  }
+}
+
+void port_registry_declare_events() {
+  for (const auto &ioport : snapshot()) {
+    if (io_port_events_enabled(ioport.get())) {
+      io_port_declare_events(ioport.get());
+    }
+  }
+}
+
+void port_registry_drop_all() {
+  std::unique_lock lock(registry().lock);
+  Ports ports = std::exchange(registry().active, {});
+  for (IOPort *ioport : std::exchange(registry().parked, {})) {
+    ports.push_back(ioport);
+  }
+  lock.unlock();
+  for (IOPort *ioport : ports) {
+    io_port_stop_sequence_and_lock(ioport).unlock();
+  }
+  io_port_wait_for_action_threads();
+  for (IOPort *ioport : ports) {
+    io_port_destroy(ioport);
+  }
+}
+
+std::unique_lock<std::mutex> port_registry_lock() {
+  return std::unique_lock(registry().lock);
+}
+
+const std::vector<IOPort *> &port_registry_active_locked() {
+  return registry().active;
+}
