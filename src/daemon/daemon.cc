@@ -15,6 +15,7 @@
 #include "daemon/paths.h"
 #include "daemon/privileges.h"
 #include "dbus/iocontrol-state.h"
+#include "events/event.h"
 #include "hwdesc/hwdesc.h"
 #include "platform/kv-log.h"
 #include "port/ioport.h"
@@ -108,6 +109,7 @@ bool bring_up_ports() {
 
 // From here on as the service account.
 void go_public() {
+  io_events_start();
   iocontrol_state_start();
   port_registry_arm_watches();
   port_registry_declare_events();
@@ -118,6 +120,8 @@ void shut_down(Daemon &daemon) {
   daemon.sigterm.reset();
   daemon.sighup.reset();
   port_registry_drop_all();
+  io_events_stop();
+  iocontrol_state_flush();
 }
 
 }  // namespace

@@ -19,6 +19,7 @@ constexpr const char *kPath = "/com/kelv/IOControl/State";
 // Action threads emit signals while the main thread may start or stop the interface.
 std::mutex skeleton_lock;
 GObjectPtr<IOControlState> skeleton;
+GObjectPtr<GDBusConnection> bus;  // once it is there
 BusName control_name;
 BusName connector_name;
 
@@ -43,6 +44,7 @@ void emit_action_sequence_done(int number) {
 }
 
 void on_bus_acquired(GDBusConnection *connection, const char * /*name*/, gpointer /*user_data*/) {
+  bus.reset(static_cast<GDBusConnection *>(g_object_ref(connection)));
   GObjectPtr<IOControlState> object(iocontrol_state_skeleton_new());
   iocontrol_connect_handlers(object.get());
   export_object(G_DBUS_INTERFACE_SKELETON(object.get()), connection, kPath);
@@ -73,4 +75,11 @@ void iocontrol_state_stop() {
   connector_withdraw();
   control_name.reset();
   connector_name.reset();
+}
+
+void iocontrol_state_flush() {
+  if (bus) {
+    flush_bus(bus.get());
+    bus.reset();
+  }
 }

@@ -6,3 +6,6 @@
 void iocontrol_state_start();
 // Withdraws the objects and gives the names up. Signals are skipped from then on.
 void iocontrol_state_stop();
+// Sees to it that what was sent last, the withdrawal of events included, leaves before the process
+// ends.
+void iocontrol_state_flush();

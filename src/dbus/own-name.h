@@ -1,4 +1,5 @@
-// A well-known name on the system bus, and the object behind it.
+// What every interface of the daemon needs of the system bus: a well-known name, an exported
+// object, and that its last words are heard.
 #pragma once
 
 #include <gio/gio.h>
@@ -30,3 +31,7 @@ class BusName {
 
 // Exports an interface; a failure is logged and leaves the daemon without that interface.
 void export_object(GDBusInterfaceSkeleton *skeleton, GDBusConnection *connection, const char *path);
+
+// Waits until everything that was sent is on its way, for a second at the most: a bus that takes
+// nothing any more must not keep the daemon from ending. Main thread, at shutdown.
+void flush_bus(GDBusConnection *connection);

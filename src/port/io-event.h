@@ -2,6 +2,7 @@
 // them is not the port's affair: see port-listener.h.
 #pragma once
 
+#include <atomic>
 #include <cstdint>
 #include <list>
 #include <optional>
@@ -16,16 +17,26 @@ struct IoEventKey {
   bool property = false;            // the key holds the state of a property event
 };
 
+// A value that threads share and that can still be copied along with the description around it.
+template <typename T>
+struct SharedValue : std::atomic<T> {
+  using std::atomic<T>::atomic;
+  using std::atomic<T>::operator=;
+  SharedValue(const SharedValue &other) : std::atomic<T>(other.load()) {}
+};
+
 struct IoEvent {
   std::optional<std::string> name;
-  std::uint32_t id = 0;           // of the declaration; 0 while not declared
   bool output = true;             // applies while the port is an output
   bool input = true;              // applies while the port is an input
   bool supervised_input = false;  // applies while the port is a supervised input
   bool declare_only = false;      // declared, never sent
-  bool filter_reset = false;      // the next send passes the repeat filter
-  std::int32_t last_value = 0;    // of the last send
   std::list<IoEventKey> keys;     // newest first
+
+  // What changes while the daemon runs. An action thread sends while the main thread declares.
+  SharedValue<std::uint32_t> id = 0;         // of the declaration; 0 while not declared
+  SharedValue<bool> filter_reset = false;    // the next send passes the repeat filter
+  SharedValue<std::int32_t> last_value = 0;  // of the last send
 };
 
 // Newest first. A list, since declarations refer to events while new ones are put in front.

@@ -58,7 +58,7 @@ void io_port_undeclare_events(IOPort *ioport) {
 
 void io_port_redeclare_events(IOPort *ioport) {
   const auto redeclare = port_listener().redeclare_event;
-  if (!redeclare) {
+  if (!ioport->events_enabled || !redeclare) {
     return;
   }
   for (auto &event : ioport->events) {
@@ -68,6 +68,9 @@ void io_port_redeclare_events(IOPort *ioport) {
 
 void io_port_declare_events_for_role(IOPort *ioport) {
   const auto &listener = port_listener();
+  if (!ioport->events_enabled) {
+    return;
+  }
   for (auto &event : ioport->events) {
     const bool applies = io_port_event_applies(ioport, event);
     if (applies && listener.declare_event) {

@@ -1,0 +1,160 @@
+#include "events/event-values.h"
+
+#include <optional>
+#include <string_view>
+
+#include "base/log.h"
+#include "port/ioport.h"
+
+namespace {
+
+constexpr std::string_view kPortName = "PORT_NAME";
+
+// 0 when there is no such type.
+int key_type(const std::optional<std::string> &word) {
+  if (word == "int") {
+    return EVENT_KEY_INT;
+  }
+  if (word == "bool") {
+    return EVENT_KEY_BOOL;
+  }
+  if (word == "double") {
+    return EVENT_KEY_DOUBLE;
+  }
+  return word == "string" ? EVENT_KEY_STRING : 0;
+}
+
+bool is_state_word(std::string_view value) {
+  return value == "PORT_STATUS" || value == "PORT_ACTIVE" || value == "PORT_SUPERVISED_STATUS";
+}
+
+const char *bit(bool value) {
+  return value ? "1" : "0";
+}
+
+std::string populate_port_status(IOPort *ioport, int type) {
+  g_assert(type != EVENT_KEY_DOUBLE);
+  const bool state = io_port_get_state(ioport);
+  return type == EVENT_KEY_STRING ? (state ? "true" : "false") : bit(state);
+}
+
+std::string populate_port_active(IOPort *ioport, int type) {
+  g_assert(type != EVENT_KEY_DOUBLE);
+  const bool state = io_port_get_state(ioport);
+  return type == EVENT_KEY_STRING ? (state ? "active" : "inactive") : bit(state);
+}
+
+std::string populate_port_supervised_status(IOPort *ioport, int type) {
+  g_assert(type != EVENT_KEY_DOUBLE);
+  const SupervisedRangeState state = io_port_get_supervised_state(ioport);
+  if (type == EVENT_KEY_BOOL) {
+    return bit(state == SUPERVISED_STATE_CLOSED);
+  }
+  return type == EVENT_KEY_INT ? std::to_string(state) : supervised_range_state2string(state);
+}
+
+std::string value_text(IOPort *ioport, const std::string &value, int type) {
+  if (value == "PORT_STATUS") {
+    return populate_port_status(ioport, type);
+  }
+  if (value == "PORT_ACTIVE") {
+    return populate_port_active(ioport, type);
+  }
+  if (value == "PORT_SUPERVISED_STATUS") {
+    return populate_port_supervised_status(ioport, type);
+  }
+  return type == EVENT_KEY_BOOL ? bit(value == "true" || value == "1") : value;
+}
+
+bool populate_value(IOPort *ioport, const IoEventKey &key, Inspectable *inspectable) {
+  const int type = key_type(key.type);
+  g_assert(type != 0);
+  const std::string text = value_text(ioport, key.value.value_or(""), type);
+  const std::string name = key.name.value_or("");
+  if (!inspectable_set_value_as_string(inspectable, name.c_str(), type, text.c_str())) {
+    log_warning("populating event key value failed - Key: %s Val: %s Type: %s", name.c_str(),
+                text.c_str(), key.type->c_str());
+    return false;
+  }
+  return true;
+}
+
+std::optional<std::string> nice_name(IOPort *ioport, const std::optional<std::string> &text) {
+  return text == kPortName ? io_port_get_name(ioport) : text;
+}
+
+const char *text_or_null(const std::optional<std::string> &text) {
+  return text ? text->c_str() : nullptr;
+}
+
+bool populate_nice_names(IOPort *ioport, const IoEventKey &key, Inspectable *inspectable) {
+  if (!key.key_nice_name && !key.value_nice_name) {
+    return true;
+  }
+  const auto key_name = nice_name(ioport, key.key_nice_name);
+  const auto value_name = nice_name(ioport, key.value_nice_name);
+  if (!inspectable_set_nice_names(inspectable, text_or_null(key.name), text_or_null(key_name),
+                                  text_or_null(value_name))) {
+    const std::string key_text = key_name.value_or("");
+    log_warning("Failed to set value nice name. Key: %s KNN: %s VNN: %s", key_text.c_str(),
+                key_text.c_str(), value_name.value_or("").c_str());
+    return false;
+  }
+  return true;
+}
+
+bool populate_declared_key(IOPort *ioport, const IoEventKey &key, Inspectable *inspectable,
+                           std::string *property_key_out) {
+  if (!populate_nice_names(ioport, key, inspectable)) {
+    return false;
+  }
+  if (key.property) {
+    *property_key_out = key.name.value_or("");
+    return true;
+  }
+  return populate_value(ioport, key, inspectable);
+}
+
+const char *fault_of(const IoEventKey &key) {
+  if (!key.name) {
+    return "it has no name";
+  }
+  const int type = key_type(key.type);
+  if (type == 0) {
+    return "its type is unknown";
+  }
+  if (type == EVENT_KEY_DOUBLE && is_state_word(key.value.value_or(""))) {
+    return "a state of the port is not a double";
+  }
+  return nullptr;
+}
+
+}  // namespace
+
+bool event_keys_are_sound(const IOPort *ioport, const std::list<IoEventKey> &keys) {
+  for (const auto &key : keys) {
+    if (const char *fault = fault_of(key)) {
+      log_warning("Port %s: event key %s is of no use: %s", io_port_describe(ioport),
+                  key.name.value_or("").c_str(), fault);
+      return false;
+    }
+  }
+  return true;
+}
+
+bool populate_event_values(IOPort *ioport, const std::list<IoEventKey> &keys,
+                           Inspectable *inspectable, bool sending, std::string *property_key_out) {
+  for (const auto &key : keys) {
+    g_assert(key_type(key.type) != 0);
+    if (sending && !key.property) {
+      continue;
+    }
+    const bool populated = sending
+                               ? populate_value(ioport, key, inspectable)
+                               : populate_declared_key(ioport, key, inspectable, property_key_out);
+    if (!populated) {
+      return false;
+    }
+  }
+  return true;
+}
