@@ -1,0 +1,77 @@
+// How late the steps of an action sequence are. Prints figures and judges nothing: they belong to
+// the machine that they are taken on.
+#include <algorithm>
+#include <cstdio>
+#include <cstdlib>
+#include <mutex>
+#include <numeric>
+#include <vector>
+
+#include "backends/backends.h"
+#include "base/condition.h"
+#include "port/ioport.h"
+#include "port/port-listener.h"
+
+namespace {
+
+constexpr int kCheckBackend = 9;
+constexpr std::int32_t kStepMs = 5;
+constexpr int kDefaultSteps = 400;
+
+std::mutex lock;
+MonotonicCondition ended;
+bool done = false;
+std::vector<gint64> step_times;
+
+void on_port_changed(const PortChange & /*change*/) {
+  step_times.push_back(g_get_monotonic_time());
+}
+
+void on_done(int /*number*/) {
+  const std::lock_guard guard(lock);
+  done = true;
+  ended.notify_all();
+}
+
+IOPortRef make_output() {
+  IOPortRef ioport(io_port_new());
+  io_port_set_type(ioport.get(), PORT_OUTPUT);
+  io_port_set_backend(ioport.get(), kCheckBackend);
+  io_port_setup(ioport.get());
+  return ioport;
+}
+
+void run(IOPort *ioport, int steps) {
+  ActionSequence sequence = {false, {}};
+  for (int i = 0; i < steps; ++i) {
+    sequence.steps.push_back({i % 2 == 0, kStepMs});
+  }
+  io_port_run_action_sequence(ioport, std::move(sequence));
+  std::unique_lock guard(lock);
+  while (!done) {
+    ended.wait(guard);
+  }
+}
+
+}  // namespace
+
+int main(int argc, char **argv) {
+  const int steps = argc > 1 ? std::max(2, std::atoi(argv[1])) : kDefaultSteps;
+  backends_register();
+  port_listener().port_changed = on_port_changed;
+  port_listener().action_sequence_done = on_done;
+  const IOPortRef ioport = make_output();
+  run(ioport.get(), steps);
+  io_port_wait_for_action_threads();
+
+  std::vector<double> late;
+  for (std::size_t i = 1; i < step_times.size(); ++i) {
+    late.push_back(static_cast<double>(step_times[i] - step_times[i - 1]) - kStepMs * 1000.0);
+  }
+  std::sort(late.begin(), late.end());
+  std::printf("%zu steps of %d ms: lateness min %.0f us, mean %.1f us, 99%% %.0f us, max %.0f us\n",
+              late.size(), kStepMs, late.front(),
+              std::accumulate(late.begin(), late.end(), 0.0) / static_cast<double>(late.size()),
+              late[late.size() * 99 / 100], late.back());
+  return 0;
+}

@@ -1,0 +1,80 @@
+#include "fuzz-support.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <cstdlib>
+
+#include "backends/backends.h"
+#include "base/glib-ptr.h"
+#include "base/unique-fd.h"
+#include "port/ioport.h"
+#include "port/port-registry.h"
+#include "settings/param.h"
+
+namespace {
+
+GLogWriterOutput drop_message(GLogLevelFlags /*level*/, const GLogField * /*fields*/,
+                              gsize /*count*/, gpointer /*user_data*/) {
+  return G_LOG_WRITER_HANDLED;
+}
+
+bool owns_no_hardware(const IOPort *ioport) {
+  constexpr int virtual_backend = 0;
+  constexpr int null_backend = 8;
+  constexpr int check_backend = 9;
+  const int kind = io_port_get_backend(ioport);
+  return kind == virtual_backend || kind == null_backend || kind == check_backend;
+}
+
+}  // namespace
+
+InputFile::InputFile() {
+  char folder[] = "/tmp/portd-fuzz-XXXXXX";
+  folder_ = g_mkdtemp(folder);
+  path_ = folder_ + "/input";
+}
+
+InputFile::~InputFile() {
+  unlink(path_.c_str());
+  rmdir(folder_.c_str());
+}
+
+void InputFile::write(const std::uint8_t *data, std::size_t size) {
+  const UniqueFd fd(open(path_.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0600));
+  if (::write(fd.get(), data, size) != static_cast<ssize_t>(size)) {
+    std::abort();
+  }
+}
+
+void fuzz_initialise() {
+  g_setenv("DBUS_SYSTEM_BUS_ADDRESS", "unix:path=/nonexistent/bus", TRUE);
+  g_log_set_writer_func(drop_message, nullptr, nullptr);
+  // The settings code prints what it finds wrong; a fuzzer makes it find a lot.
+  if (!std::freopen("/dev/null", "w", stdout)) {
+    std::abort();
+  }
+  backends_register();
+}
+
+void fuzz_exercise_ports() {
+  for (std::size_t i = 0; i < port_registry_count(); ++i) {
+    const IOPortRef ref = port_registry_nth(i);
+    IOPort *ioport = ref.get();
+    if (!io_port_has_backend(ioport) || !owns_no_hardware(ioport)) {
+      continue;
+    }
+    io_port_setup(ioport);
+    io_port_set_watch(ioport);
+    io_port_set_state(ioport, true);
+    io_port_set_virtual(ioport, true);
+    io_port_set_activelow(ioport, true, true);
+    io_port_set_activelow(ioport, true, false);
+    io_port_set_direction(ioport, !io_port_direction_input(ioport));
+    io_port_get_state(ioport);
+    io_port_drop(ioport);
+    io_port_setup(ioport);
+  }
+  port_registry_count_inputs();
+  port_registry_supervisable_numbers();
+}

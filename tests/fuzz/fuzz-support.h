@@ -1,0 +1,28 @@
+// What the fuzz targets share.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <string>
+
+// A file in a folder of the process's own, replaced for every input.
+class InputFile {
+ public:
+  InputFile();
+  ~InputFile();
+  InputFile(const InputFile &) = delete;
+  InputFile &operator=(const InputFile &) = delete;
+
+  void write(const std::uint8_t *data, std::size_t size);
+  const std::string &path() const { return path_; }
+
+ private:
+  std::string folder_;
+  std::string path_;
+};
+
+// Backends registered, no bus to reach, log messages dropped. Once.
+void fuzz_initialise();
+// Calls what clients can call on every port, but sets up only backends that own no hardware: a
+// fuzzed document names whatever path it likes.
+void fuzz_exercise_ports();
