@@ -1,4 +1,5 @@
 // Role and state of a port: the two trips between a logical state and a raw level.
+#include "base/assert.h"
 #include "base/log.h"
 #include "port/ioport-private.h"
 #include "port/port-listener.h"
@@ -14,7 +15,7 @@ bool is_driven_output(const IOPort *ioport) {
 }  // namespace
 
 bool io_port_input(const IOPort *port) {
-  g_assert_nonnull(port->functions);
+  assert_nonnull(port->functions);
   return port->type == PORT_INPUT || (port->type == PORT_CONFIGURABLE && port->direction);
 }
 
