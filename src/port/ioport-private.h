@@ -45,6 +45,9 @@ struct IOPort {
 
   IoEvents events;
 
+  // Main thread only.
+  SupervisedRanges supervised_ranges;
+
   // What an action thread reads while the main thread may write it.
   std::atomic<bool> activelow_output = false;
   std::atomic<bool> activelow_input = false;

@@ -41,6 +41,10 @@ bool io_port_set_supervised(IOPort *port, bool supervised) {
   return true;
 }
 
+SupervisedRanges &io_port_supervised_ranges(IOPort *ioport) {
+  return ioport->supervised_ranges;
+}
+
 bool io_port_get_supervised_ranges(IOPort *port, SupervisedRanges *ranges) {
   g_assert_nonnull(port->functions);
   g_assert_nonnull(ranges);

@@ -49,9 +49,12 @@ void rebuild_released_backend(IOPort *ioport) {
   }
   ioport->backend_released = false;
   install_backend(ioport);
+  // The description's ranges are only the first ones; the user may have set others since.
+  const SupervisedRanges ranges = ioport->supervised_ranges;
   for (const auto &property : ioport->backend_properties) {
     apply_backend_property(ioport, property);
   }
+  ioport->supervised_ranges = ranges;
 }
 
 }  // namespace
