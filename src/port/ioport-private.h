@@ -44,8 +44,6 @@ struct IOPort {
   std::uint32_t spare_setting = 1;
 
   IoEvents events;
-
-  // Main thread only.
   SupervisedRanges supervised_ranges;
 
   // What an action thread reads while the main thread may write it.
