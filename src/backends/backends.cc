@@ -13,8 +13,8 @@ struct Backend {
 
 constexpr Backend kBackends[] = {
     {"virtual", 0, virtual_backend_functions},
-    {"gpio", 1, nullptr},
-    {"spiadc", 2, nullptr},
+    {"gpio", 1, gpio_backend_functions},
+    {"spiadc", 2, spiadc_backend_functions},
     {"sysfs", 6, sysfs_backend_functions},
     {"iobox", 7, nullptr},
     {"null", 8, null_backend_functions},
