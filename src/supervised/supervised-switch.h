@@ -1,0 +1,21 @@
+// Switching a supervised port between supervision and its plain pin, and between input and output.
+// Main thread.
+#pragma once
+
+#include "port/ioport.h"
+
+// What differs between the backends.
+struct SupervisedParts {
+  // Drives the control pins to what the port is now.
+  bool (*set_control_pins)(IOPort *port);
+  // Watches the measured line, or no longer. Only called between set-up and drop.
+  void (*set_line_watch)(IOPort *port, bool on);
+};
+
+// Watches the plain pin or the measured line; never both, and neither before set-up.
+void supervised_switch_watch(IOPort *port, bool measured, const SupervisedParts &parts);
+// A set_supervised: switches the watch, makes the port an input and drives the control pins. Where
+// the line stays measured without supervision `measured` differs from `supervised`.
+bool supervised_switch(IOPort *port, bool supervised, bool measured, const SupervisedParts &parts);
+// A set_direction, called with the new direction already in the port. False when a pin refused.
+bool supervised_turn(IOPort *port, bool input, const SupervisedParts &parts);
