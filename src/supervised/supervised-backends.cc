@@ -10,7 +10,7 @@ struct Backend {
 
 constexpr Backend kBackends[] = {
     {"spi", 3, supervised_spi_backend_functions},
-    {"iio", 4, nullptr},
+    {"iio", 4, supervised_iio_backend_functions},
     {"iio-interrupt", 5, nullptr},
 };
 

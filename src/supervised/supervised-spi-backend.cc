@@ -17,8 +17,8 @@
 #include "supervised/supervised-backends.h"
 #include "supervised/supervised-data.h"
 #include "supervised/supervised-edge-watch.h"
+#include "supervised/supervised-parts.h"
 #include "supervised/supervised-pins.h"
-#include "supervised/supervised-switch.h"
 #include "supervised/supervised-utils.h"
 
 namespace {
@@ -51,11 +51,6 @@ bool spi_set_control_pins(IOPort *port) {
   return supervised_drive_control_pins(port, supervised_control_levels(port));
 }
 
-constexpr SupervisedParts kParts = {
-    .set_control_pins = spi_set_control_pins,
-    .set_line_watch = supervised_set_poll,
-};
-
 // --- Set-up ---
 
 bool open_device(SpiSupervisedData *data) {
@@ -78,34 +73,25 @@ bool open_device(SpiSupervisedData *data) {
 }
 
 bool spi_setup_line(IOPort *port) {
-  if (!supervised_request_control_pins(port, false)) {
-    return false;
+  if (open_device(data_of(port))) {
+    return true;
   }
-  // A pin that refuses is logged; the port is set up all the same.
-  (void)spi_set_control_pins(port);
-  if (!open_device(data_of(port))) {
-    log_critical("Failed to open spi device.");
-    return false;
-  }
-  return true;
+  log_critical("Failed to open spi device.");
+  return false;
 }
 
+constexpr SupervisedParts kParts = {
+    .sio_ctrl_optional = false,
+    .set_control_pins = spi_set_control_pins,
+    .setup_line = spi_setup_line,
+    .set_line_watch = supervised_set_poll,
+};
+
 bool spi_setup(IOPort *port, bool initial_level) {
-  SpiSupervisedData *data = data_of(port);
-  data->initialised = false;
-  if (!supervised_check_pins(port)) {
-    return false;
-  }
-  supervised_request_pins(port, initial_level);
-  data->initialised = io_port_get_type(port) == PORT_OUTPUT || spi_setup_line(port);
-  return data->initialised;
+  return supervised_setup(port, initial_level, kParts);
 }
 
 // --- Operations ---
-
-bool is_supervisable(IOPort *port) {
-  return io_port_get_type(port) != PORT_OUTPUT;
-}
 
 bool set_supervised(IOPort *port, bool supervised) {
   return supervised_switch(port, supervised, supervised, kParts);
@@ -165,7 +151,7 @@ void free_data(IOPort *port) {
 
 constexpr PortFunctions kFunctions = {
     .setup = spi_setup,
-    .is_supervisable = is_supervisable,
+    .is_supervisable = supervised_is_supervisable,
     .set_supervised = set_supervised,
     .get_supervised_ranges = supervised_ranges_get,
     .set_supervised_ranges = supervised_ranges_set,

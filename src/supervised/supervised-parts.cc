@@ -1,8 +1,36 @@
-#include "supervised/supervised-switch.h"
+#include "supervised/supervised-parts.h"
 
 #include "supervised/supervised-data.h"
 #include "supervised/supervised-edge-watch.h"
 #include "supervised/supervised-pins.h"
+
+namespace {
+
+bool setup_input(IOPort *port, const SupervisedParts &parts) {
+  if (!supervised_request_control_pins(port, parts.sio_ctrl_optional)) {
+    return false;
+  }
+  // A pin that refuses is logged; the port is set up all the same.
+  (void)parts.set_control_pins(port);
+  return parts.setup_line(port);
+}
+
+}  // namespace
+
+bool supervised_setup(IOPort *port, bool initial_level, const SupervisedParts &parts) {
+  SupervisedData *data = supervised_data(port);
+  data->initialised = false;
+  if (!supervised_check_pins(port)) {
+    return false;
+  }
+  supervised_request_pins(port, initial_level);
+  data->initialised = io_port_get_type(port) == PORT_OUTPUT || setup_input(port, parts);
+  return data->initialised;
+}
+
+bool supervised_is_supervisable(IOPort *port) {
+  return io_port_get_type(port) != PORT_OUTPUT;
+}
 
 void supervised_switch_watch(IOPort *port, bool measured, const SupervisedParts &parts) {
   const SupervisedData *data = supervised_data(port);
