@@ -21,6 +21,8 @@
 #include "port/ioport.h"
 #include "port/port-registry.h"
 #include "settings/param.h"
+#include "supervised/iosupervised.h"
+#include "supervised/supervised-backends.h"
 
 namespace {
 
@@ -51,6 +53,7 @@ void install_signal_sources(Daemon &daemon) {
 
 void load_hardware_description() {
   backends_register();
+  supervised_backends_register();
   hwdesc_load_file(kHardwareDescription);
   hwdesc_load_directory(kHardwareFragments);
 }
@@ -111,11 +114,13 @@ bool bring_up_ports() {
 void go_public() {
   io_events_start();
   iocontrol_state_start();
+  iosupervised_start();
   port_registry_arm_watches();
   port_registry_declare_events();
 }
 
 void shut_down(Daemon &daemon) {
+  iosupervised_stop();
   iocontrol_state_stop();
   daemon.sigterm.reset();
   daemon.sighup.reset();

@@ -1,7 +1,7 @@
 #include "dbus/connector.h"
 
 #include "base/glib-ptr.h"
-#include "dbus/own-name.h"
+#include "base/own-name.h"
 #include "pcd-connector-gen.h"
 #include "port/ioport.h"
 #include "port/port-registry.h"

@@ -44,6 +44,7 @@ struct IOPort {
   std::uint32_t spare_setting = 1;
 
   IoEvents events;
+  SupervisedRanges supervised_ranges;
 
   // What an action thread reads while the main thread may write it.
   std::atomic<bool> activelow_output = false;
@@ -76,6 +77,5 @@ void io_port_destroy(IOPort *ioport);
 // Sends those events of the port that apply to its role, while its events are enabled.
 void io_port_fire_events(IOPort *ioport, std::int32_t state);
 void io_port_undeclare_events(IOPort *ioport);
-void io_port_redeclare_events(IOPort *ioport);
 // Declares the events that apply to the port's role and withdraws the others.
 void io_port_declare_events_for_role(IOPort *ioport);
