@@ -1,22 +1,23 @@
-// A GObject signal handler that disconnects itself. Declare it after the owner of the object that
-// it is connected to, so that it goes first. Main thread only.
+// A GObject signal handler that disconnects itself. It keeps the object alive that it is connected
+// to. Main thread only.
 #pragma once
 
-#include <glib-object.h>
-
 #include <utility>
+
+#include "base/glib-ptr.h"
 
 class SignalHandler {
  public:
   SignalHandler() = default;
   // `signal` may carry a detail, as in "notify::g-name-owner".
   SignalHandler(gpointer instance, const char *signal, GCallback callback, gpointer user_data)
-      : instance_(instance), id_(g_signal_connect(instance, signal, callback, user_data)) {}
+      : instance_(static_cast<GObject *>(g_object_ref(instance))),
+        id_(g_signal_connect(instance, signal, callback, user_data)) {}
   SignalHandler(SignalHandler &&other) noexcept
-      : instance_(std::exchange(other.instance_, nullptr)), id_(std::exchange(other.id_, 0)) {}
+      : instance_(std::move(other.instance_)), id_(std::exchange(other.id_, 0)) {}
   SignalHandler &operator=(SignalHandler &&other) noexcept {
     reset();
-    instance_ = std::exchange(other.instance_, nullptr);
+    instance_ = std::move(other.instance_);
     id_ = std::exchange(other.id_, 0);
     return *this;
   }
@@ -27,11 +28,12 @@ class SignalHandler {
   explicit operator bool() const { return id_ != 0; }
   void reset() {
     if (id_ != 0) {
-      g_signal_handler_disconnect(instance_, std::exchange(id_, 0));
+      g_signal_handler_disconnect(instance_.get(), std::exchange(id_, 0));
     }
+    instance_.reset();
   }
 
  private:
-  gpointer instance_ = nullptr;
+  GObjectPtr<GObject> instance_;
   gulong id_ = 0;
 };
