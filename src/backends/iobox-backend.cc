@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <iterator>
-#include <string>
 #include <string_view>
 
 #include "backends/tables.h"
@@ -54,23 +53,12 @@ Patience &patience() {
   return instance;
 }
 
-std::string owner_of(GDBusProxy *proxy) {
-  const GCharPtr owner(g_dbus_proxy_get_name_owner(proxy));
-  return owner ? owner.get() : "";
-}
-
 // Null when there was no answer, which is logged. Any thread.
 GVariantPtr iobox_dbus_call(IoBoxBackendData *data, const char *method, GVariant *parameters) {
-  const std::string owner = owner_of(data->proxy.get());
-  const std::int64_t begun = g_get_monotonic_time();
   Error error;
-  GVariantPtr reply(
-      g_dbus_proxy_call_sync(data->proxy.get(), method, parameters, G_DBUS_CALL_FLAGS_NONE,
-                             patience().timeout_ms(owner, begun), nullptr, error.out()));
-  if (reply) {
-    patience().note_answer();
-  } else {
-    patience().note_failure(owner, begun, g_get_monotonic_time());
+  GVariantPtr reply =
+      call_with_patience(patience(), data->proxy.get(), method, parameters, error.out());
+  if (!reply) {
     log_place(kLogLevelUser, kCallFailed, "Failed to call method %s: %s", method, error.message());
   }
   return reply;

@@ -8,6 +8,8 @@
 #include <mutex>
 #include <string>
 
+#include "base/glib-ptr.h"
+
 class Patience {
  public:
   static constexpr int kBusDefault = -1;  // the bus's own limit of 25 seconds
@@ -27,3 +29,11 @@ class Patience {
   std::string silent_owner_;
   std::int64_t silent_until_us_ = 0;
 };
+
+// The unique bus name of the process behind a proxy, empty for none. Any thread.
+std::string proxy_owner(GDBusProxy *proxy);
+
+// Calls a method through the proxy and waits as patience has it. Null and `error`: no answer, or an
+// error as the answer. Any thread.
+GVariantPtr call_with_patience(Patience &patience, GDBusProxy *proxy, const char *method,
+                               GVariant *parameters, GError **error);
