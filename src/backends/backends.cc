@@ -22,7 +22,7 @@ constexpr Backend kBackends[] = {
     {"iio", 4, nullptr},
     {"iio-interrupt", 5, nullptr},
     {"sysfs", 6, sysfs_backend_functions},
-    {"iobox", 7, nullptr},
+    {"iobox", 7, iobox_backend_functions},
     {"null", 8, null_backend_functions},
     {"check", 9, check_backend_functions},
 };

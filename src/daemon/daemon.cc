@@ -16,6 +16,8 @@
 #include "daemon/privileges.h"
 #include "dbus/iocontrol-state.h"
 #include "events/event.h"
+#include "events/manual-triggers.h"
+#include "events/trigger-ports.h"
 #include "hwdesc/hwdesc.h"
 #include "platform/kv-log.h"
 #include "port/ioport.h"
@@ -107,16 +109,26 @@ bool bring_up_ports() {
   return true;
 }
 
+void start_manual_triggers() {
+  if (const auto first = hwdesc_first_virtual_input()) {
+    manual_trigger_configure(*first);
+  }
+  manual_trigger_start();
+}
+
 // From here on as the service account.
 void go_public() {
   io_events_start();
   iocontrol_state_start();
   port_registry_arm_watches();
   port_registry_declare_events();
+  start_manual_triggers();
 }
 
 void shut_down(Daemon &daemon) {
   iocontrol_state_stop();
+  manual_trigger_clear();
+  manual_trigger_stop();
   daemon.sigterm.reset();
   daemon.sighup.reset();
   port_registry_drop_all();

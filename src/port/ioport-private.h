@@ -44,6 +44,7 @@ struct IOPort {
   std::uint32_t spare_setting = 1;
 
   IoEvents events;
+  SupervisedRanges supervised_ranges;
 
   // What an action thread reads while the main thread may write it.
   std::atomic<bool> activelow_output = false;

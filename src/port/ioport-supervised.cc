@@ -41,6 +41,14 @@ bool io_port_set_supervised(IOPort *port, bool supervised) {
   return true;
 }
 
+const SupervisedRanges &io_port_range_list(const IOPort *ioport) {
+  return ioport->supervised_ranges;
+}
+
+void io_port_store_range_list(IOPort *ioport, SupervisedRanges ranges) {
+  ioport->supervised_ranges = std::move(ranges);
+}
+
 bool io_port_get_supervised_ranges(IOPort *port, SupervisedRanges *ranges) {
   g_assert_nonnull(port->functions);
   g_assert_nonnull(ranges);

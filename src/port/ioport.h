@@ -184,6 +184,10 @@ bool io_port_set_direction(IOPort *ioport, bool input);
 bool io_port_is_supervisable(IOPort *ioport);
 // False unless the port is supervisable.
 bool io_port_set_supervised(IOPort *ioport, bool supervised);
+// The port's own range list, for the backends that keep theirs here: unlike a backend's record it
+// stays while the port is out of service.
+const SupervisedRanges &io_port_range_list(const IOPort *ioport);
+void io_port_store_range_list(IOPort *ioport, SupervisedRanges ranges);
 // Copies the port's ranges; false unless the port is supervisable.
 bool io_port_get_supervised_ranges(IOPort *ioport, SupervisedRanges *ranges);
 // False, at times without an error, when they were refused.
