@@ -38,6 +38,7 @@ class Neighbour:
         """`objects` maps paths to (interface, properties, methods); for `behaviour` see player.py."""
         self.device, self.name = device, name
         self._objects = objects
+        self.first_path = next(iter(objects))
         device.bus.start()
         device.write(f"/etc/dbus-1/system.d/{name}.conf", _POLICY.format(name=name))
         device.bus.bus_call("ReloadConfig")

@@ -1,7 +1,7 @@
 """A template of python-dbusmock that plays any service.
 
 Its parameters: "objects", a map from path to (interface, properties, methods); "delay", for how many
-seconds every reading of properties takes; "endless", a folder below which every path has an object
+seconds every reading of properties takes; "error", the error that answers it; "endless", a folder below which every path has an object
 with the property "Enabled".
 """
 
@@ -22,11 +22,15 @@ def load(mock, parameters):
         mock.AddObject(path, interface, properties, [tuple(method) for method in methods])
     delay = parameters.get("delay", 0)
     endless = parameters.get("endless")
+    error = parameters.get("error")
 
     def on_message(connection, message):
         if message.get_member() != "GetAll":
             return dbus.lowlevel.HANDLER_RESULT_NOT_YET_HANDLED
         time.sleep(delay)
+        if error:
+            connection.send_message(dbus.lowlevel.ErrorMessage(message, error, "broken"))
+            return dbus.lowlevel.HANDLER_RESULT_HANDLED
         if endless and message.get_path().startswith(endless + "/"):
             reply = dbus.lowlevel.MethodReturnMessage(message)
             reply.append({"Enabled": True}, signature="a{sv}")
