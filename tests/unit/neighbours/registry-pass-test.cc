@@ -21,7 +21,7 @@ const PortFunctions *curious_backend(IOPort * /*port*/) {
 TEST(RegistryPasses, LeaveTheRegistryFreeWhileABackendIsSetUp) {
   constexpr int kCheckBackend = 9;
   io_port_register_backend(kCheckBackend, curious_backend);
-  const IOPortRef port(io_port_new());
+  IOPortRef port(io_port_new());
   io_port_set_optional(port.get(), true);
   io_port_set_backend(port.get(), kCheckBackend);
   port_registry_add(port.get());
@@ -29,6 +29,7 @@ TEST(RegistryPasses, LeaveTheRegistryFreeWhileABackendIsSetUp) {
   EXPECT_EQ(port_registry_retry_parked(), 1U);
   port_registry_setup_all();
   EXPECT_TRUE(io_port_is_set_up(port.get()));
+  port.reset();
   port_registry_drop_all();
 }
 
