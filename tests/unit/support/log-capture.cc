@@ -59,9 +59,9 @@ bool LogCapture::took_critical(std::string_view text) {
   return took(G_LOG_LEVEL_CRITICAL, text);
 }
 
-bool LogCapture::took_beginning(GLogLevelFlags level, std::string_view beginning) {
+bool LogCapture::took_containing(GLogLevelFlags level, std::string_view part) {
   return take_first(
-      [&](const auto &m) { return m.level == level && m.text.starts_with(beginning); });
+      [&](const auto &m) { return m.level == level && m.text.find(part) != std::string::npos; });
 }
 
 std::size_t LogCapture::take_all(GLogLevelFlags level, std::string_view text) {

@@ -27,8 +27,8 @@ class LogCapture {
   [[nodiscard]] bool took(GLogLevelFlags level, std::string_view text);
   [[nodiscard]] bool took_warning(std::string_view text);
   [[nodiscard]] bool took_critical(std::string_view text);
-  // The same for a text that only begins like that, where the system words the rest.
-  [[nodiscard]] bool took_beginning(GLogLevelFlags level, std::string_view beginning);
+  // The same for a part of the text, where the system words the rest.
+  [[nodiscard]] bool took_containing(GLogLevelFlags level, std::string_view part);
   // Takes every message of that level and text and gives their number.
   [[nodiscard]] std::size_t take_all(GLogLevelFlags level, std::string_view text);
   // Takes everything, for tests that are not about what is logged.
