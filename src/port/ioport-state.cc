@@ -1,4 +1,5 @@
 // Role and state of a port: the two trips between a logical state and a raw level.
+#include "base/assert.h"
 #include "base/log.h"
 #include "port/ioport-private.h"
 #include "port/port-listener.h"
@@ -14,7 +15,7 @@ bool is_driven_output(const IOPort *ioport) {
 }  // namespace
 
 bool io_port_input(const IOPort *port) {
-  g_assert_nonnull(port->functions);
+  assert_nonnull(port->functions);
   return port->type == PORT_INPUT || (port->type == PORT_CONFIGURABLE && port->direction);
 }
 
@@ -79,7 +80,8 @@ bool io_port_set_virtual(IOPort *ioport, bool state) {
   if (!ioport->events_enabled) {
     return true;
   }
-  if (ioport->backend == kVirtualBackend && ioport->type == PORT_OUTPUT) {
+  if (ioport->backend == kVirtualBackend && ioport->type == PORT_OUTPUT &&
+      io_port_backend_serves(ioport)) {
     ioport->functions->set_state(ioport, state);
   }
   io_port_fire_events(ioport, state);
@@ -113,7 +115,8 @@ void io_port_send_signal(IOPort *port, bool virtual_change, bool state) {
 
 void io_port_set_watch(IOPort *port) {
   g_assert(port != NULL);
-  if (port->events_enabled && io_port_input(port) && port->functions->start_watch) {
+  if (port->events_enabled && io_port_input(port) && port->functions->start_watch &&
+      io_port_backend_serves(port)) {
     port->functions->start_watch(port);
   }
 }

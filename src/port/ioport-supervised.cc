@@ -2,6 +2,7 @@
 // changing a range.
 #include <algorithm>
 
+#include "base/assert.h"
 #include "base/glib-ptr.h"
 #include "base/log.h"
 #include "port/ioport-private.h"
@@ -21,13 +22,14 @@ bool valid_limits(std::uint32_t lower, std::uint32_t upper) {
 }  // namespace
 
 bool io_port_is_supervisable(IOPort *port) {
-  g_assert_nonnull(port);
-  g_assert_nonnull(port->functions);
-  return port->functions->is_supervisable && port->functions->is_supervisable(port);
+  assert_nonnull(port);
+  assert_nonnull(port->functions);
+  return port->functions->is_supervisable && io_port_backend_serves(port) &&
+         port->functions->is_supervisable(port);
 }
 
 bool io_port_set_supervised(IOPort *port, bool supervised) {
-  g_assert_nonnull(port->functions);
+  assert_nonnull(port->functions);
   if (!io_port_is_supervisable(port)) {
     return false;
   }
@@ -50,8 +52,8 @@ void io_port_store_range_list(IOPort *ioport, SupervisedRanges ranges) {
 }
 
 bool io_port_get_supervised_ranges(IOPort *port, SupervisedRanges *ranges) {
-  g_assert_nonnull(port->functions);
-  g_assert_nonnull(ranges);
+  assert_nonnull(port->functions);
+  assert_nonnull(ranges);
   if (!io_port_is_supervisable(port) || !port->functions->get_supervised_ranges) {
     return false;
   }
@@ -60,7 +62,7 @@ bool io_port_get_supervised_ranges(IOPort *port, SupervisedRanges *ranges) {
 }
 
 bool io_port_set_supervised_ranges(IOPort *port, SupervisedRanges ranges, GError **error) {
-  g_assert_nonnull(port->functions);
+  assert_nonnull(port->functions);
   return io_port_is_supervisable(port) && port->functions->set_supervised_ranges &&
          port->functions->set_supervised_ranges(port, std::move(ranges), error);
 }
@@ -95,9 +97,9 @@ bool io_port_set_supervised_range(IOPort *ioport, const char *state_word, std::u
 
 bool io_port_get_supervised_readout(IOPort *port, SupervisedRangeState *state, std::uint32_t *level,
                                     GError **error) {
-  g_assert_nonnull(port->functions);
-  g_assert_nonnull(state);
-  g_assert_nonnull(level);
+  assert_nonnull(port->functions);
+  assert_nonnull(state);
+  assert_nonnull(level);
   if (!port->functions->get_supervised_readout) {
     g_set_error_literal(error, io_control_error_quark(), IO_CONTROL_ERROR_GENERIC,
                         "Not applicable for port.");

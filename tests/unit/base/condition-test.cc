@@ -1,0 +1,101 @@
+#include "base/condition.h"
+
+#include <gtest/gtest.h>
+
+#include <thread>
+
+#include "support/deadline.h"
+
+namespace {
+
+constexpr std::int64_t kMillisecondUs = 1000;
+
+TEST(MonotonicCondition, WakesAWaiterThatIsNotified) {
+  MonotonicCondition condition;
+  std::mutex mutex;
+  bool ready = false;
+  std::thread notifier([&] {
+    const std::lock_guard lock(mutex);
+    ready = true;
+    condition.notify_all();
+  });
+  {
+    std::unique_lock lock(mutex);
+    while (!ready) {
+      condition.wait(lock);
+    }
+    EXPECT_TRUE(lock.owns_lock());
+  }
+  notifier.join();
+}
+
+TEST(MonotonicCondition, WakesEveryWaiter) {
+  MonotonicCondition condition;
+  std::mutex mutex;
+  bool ready = false;
+  int awake = 0;
+  const auto wait = [&] {
+    std::unique_lock lock(mutex);
+    while (!ready) {
+      condition.wait(lock);
+    }
+    ++awake;
+  };
+  std::thread first(wait);
+  std::thread second(wait);
+  {
+    const std::lock_guard lock(mutex);
+    ready = true;
+    condition.notify_all();
+  }
+  first.join();
+  second.join();
+  EXPECT_EQ(awake, 2);
+}
+
+TEST(MonotonicCondition, WaitsUntilTheDeadlineWhenNobodyNotifies) {
+  MonotonicCondition condition;
+  std::mutex mutex;
+  std::unique_lock lock(mutex);
+  const std::int64_t deadline = g_get_monotonic_time() + 5 * kMillisecondUs;
+  while (g_get_monotonic_time() < deadline) {
+    condition.wait_until(lock, deadline);
+  }
+  EXPECT_GE(g_get_monotonic_time(), deadline);
+  EXPECT_TRUE(lock.owns_lock());
+}
+
+TEST(MonotonicCondition, DoesNotWaitForADeadlineThatHasPassed) {
+  MonotonicCondition condition;
+  std::mutex mutex;
+  std::unique_lock lock(mutex);
+  const std::int64_t begin = g_get_monotonic_time();
+  for (const std::int64_t deadline :
+       {begin, begin - 1, std::int64_t{1}, std::int64_t{0}, std::int64_t{-1}, INT64_MIN}) {
+    condition.wait_until(lock, deadline);
+  }
+  EXPECT_LT(g_get_monotonic_time() - begin, kTestPatienceUs);
+  EXPECT_TRUE(lock.owns_lock());
+}
+
+TEST(MonotonicCondition, IsWokenBeforeALaterDeadline) {
+  MonotonicCondition condition;
+  std::mutex mutex;
+  bool ready = false;
+  std::thread notifier([&] {
+    const std::lock_guard lock(mutex);
+    ready = true;
+    condition.notify_all();
+  });
+  const std::int64_t deadline = deadline_of_a_test();
+  {
+    std::unique_lock lock(mutex);
+    while (!ready && g_get_monotonic_time() < deadline) {
+      condition.wait_until(lock, deadline);
+    }
+  }
+  notifier.join();
+  EXPECT_LT(g_get_monotonic_time(), deadline);
+}
+
+}  // namespace

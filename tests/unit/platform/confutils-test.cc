@@ -1,0 +1,164 @@
+#include "platform/confutils.h"
+
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include "base/glib-ptr.h"
+#include "support/file-size-limit.h"
+#include "support/recording-listener.h"
+#include "support/temp-dir.h"
+
+namespace {
+
+constexpr uid_t kSomeone = 1234;
+constexpr gid_t kSomeGroup = 2345;
+
+bool set_contents(const std::string &path, std::string_view text, Error &error) {
+  return confutils_set_file_contents_with_sync(
+             path.c_str(), text.data(), static_cast<gssize>(text.size()), error.out()) != FALSE;
+}
+
+mode_t mode_of(const std::string &path) {
+  struct stat status {};
+  EXPECT_EQ(stat(path.c_str(), &status), 0);
+  return status.st_mode & ALLPERMS;
+}
+
+class Umask {
+ public:
+  explicit Umask(mode_t mask) : old_(umask(mask)) {}
+  ~Umask() { umask(old_); }
+  Umask(const Umask &) = delete;
+  Umask &operator=(const Umask &) = delete;
+
+ private:
+  mode_t old_;
+};
+
+TEST(Confutils, MakesANewFileThatEveryoneMayReadWhateverTheUmask) {
+  const TempDir dir;
+  const Umask tight(0077);
+  Error error;
+  EXPECT_TRUE(set_contents(dir.path("new"), "text", error));
+  EXPECT_FALSE(error);
+  EXPECT_EQ(dir.read("new"), "text");
+  EXPECT_EQ(mode_of(dir.path("new")), 0644U);
+}
+
+TEST(Confutils, ReplacesTheWholeOfAFile) {
+  const TempDir dir;
+  const std::string file = dir.write("file", "something longer than what comes");
+  Error error;
+  EXPECT_TRUE(set_contents(file, "short", error));
+  EXPECT_EQ(dir.read("file"), "short");
+  EXPECT_EQ(dir.names(), Lines{"file"});
+}
+
+TEST(Confutils, KeepsTheModeOfTheFileThatItReplaces) {
+  const TempDir dir;
+  const std::string file = dir.write("file", "old");
+  ASSERT_EQ(chmod(file.c_str(), 0640), 0);
+  Error error;
+  EXPECT_TRUE(set_contents(file, "new", error));
+  EXPECT_EQ(mode_of(file), 0640U);
+}
+
+TEST(Confutils, KeepsTheOwnerAsFarAsTheCallerMaySetIt) {
+  const TempDir dir;
+  const std::string file = dir.write("file", "old");
+  const bool may_give_away = chown(file.c_str(), kSomeone, kSomeGroup) == 0;
+  Error error;
+  EXPECT_TRUE(set_contents(file, "new", error));
+  struct stat status {};
+  ASSERT_EQ(stat(file.c_str(), &status), 0);
+  EXPECT_EQ(status.st_uid, may_give_away ? kSomeone : geteuid());
+  EXPECT_EQ(status.st_gid, may_give_away ? kSomeGroup : getegid());
+  EXPECT_EQ(dir.read("file"), "new");
+}
+
+TEST(Confutils, WritesNothingAsAnEmptyFile) {
+  const TempDir dir;
+  const std::string file = dir.write("file", "old");
+  Error error;
+  EXPECT_TRUE(set_contents(file, "", error));
+  EXPECT_EQ(dir.read("file"), "");
+}
+
+TEST(Confutils, WritesBytesBeyondAZeroWhenGivenALength) {
+  const TempDir dir;
+  const std::string_view bytes("a\0b", 3);
+  Error error;
+  EXPECT_TRUE(set_contents(dir.path("file"), bytes, error));
+  EXPECT_EQ(dir.read("file"), bytes);
+}
+
+TEST(Confutils, StopsAtTheTerminatingZeroWithoutALength) {
+  const TempDir dir;
+  const std::string file = dir.path("file");
+  EXPECT_TRUE(confutils_set_file_contents_with_sync(file.c_str(), "a\0b", -1, nullptr));
+  EXPECT_EQ(dir.read("file"), "a");
+}
+
+TEST(Confutils, ReplacesTheFileThatALinkNamesAndKeepsTheLink) {
+  const TempDir dir;
+  dir.make_directory("elsewhere");
+  const std::string target = dir.write("elsewhere/target", "old");
+  const std::string link = dir.path("link");
+  ASSERT_EQ(symlink("elsewhere/target", link.c_str()), 0);
+  Error error;
+  EXPECT_TRUE(set_contents(link, "new", error));
+  EXPECT_EQ(dir.read("elsewhere/target"), "new");
+  struct stat status {};
+  ASSERT_EQ(lstat(link.c_str(), &status), 0);
+  EXPECT_TRUE(S_ISLNK(status.st_mode));
+  EXPECT_EQ(dir.names(), (Lines{"elsewhere", "link"}));
+}
+
+TEST(Confutils, LeavesTheOldFileAndNothingElseWhenTheDiskIsFull) {
+  const TempDir dir;
+  const std::string file = dir.write("file", "old");
+  const std::string large(64, 'x');
+  Error error;
+  {
+    const FileSizeLimit limit(large.size() / 2);
+    EXPECT_FALSE(set_contents(file, large, error));
+  }
+  EXPECT_TRUE(error);
+  EXPECT_EQ(error.get()->domain, G_FILE_ERROR);
+  EXPECT_EQ(dir.read("file"), "old");
+  EXPECT_EQ(dir.names(), Lines{"file"});
+}
+
+TEST(Confutils, LeavesNothingBehindWhenANewFileDoesNotFit) {
+  const TempDir dir;
+  Error error;
+  {
+    const FileSizeLimit limit(0);
+    EXPECT_FALSE(set_contents(dir.path("file"), "text", error));
+  }
+  EXPECT_TRUE(error);
+  EXPECT_EQ(dir.names(), Lines{});
+}
+
+TEST(Confutils, RefusesAFileInADirectoryThatDoesNotExist) {
+  const TempDir dir;
+  Error error;
+  EXPECT_FALSE(set_contents(dir.path("missing/file"), "text", error));
+  EXPECT_TRUE(error.matches(G_FILE_ERROR, G_FILE_ERROR_NOENT)) << error.message();
+}
+
+TEST(Confutils, DoesNotReplaceADirectory) {
+  const TempDir dir;
+  const std::string directory = dir.make_directory("directory");
+  Error error;
+  EXPECT_FALSE(set_contents(directory, "text", error));
+  EXPECT_TRUE(error.matches(G_FILE_ERROR, G_FILE_ERROR_ISDIR)) << error.message();
+  EXPECT_EQ(dir.names(), Lines{"directory"});
+}
+
+TEST(Confutils, FailsWithoutAnErrorToSet) {
+  EXPECT_FALSE(confutils_set_file_contents_with_sync("/nonexistent/file", "text", -1, nullptr));
+}
+
+}  // namespace

@@ -1,0 +1,76 @@
+#include "support/log-capture.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cstdio>
+#include <iterator>
+
+namespace {
+
+constexpr auto kWarningOrWorse =
+    static_cast<GLogLevelFlags>(G_LOG_LEVEL_ERROR | G_LOG_LEVEL_CRITICAL | G_LOG_LEVEL_WARNING);
+
+}  // namespace
+
+LogCapture::LogCapture() {
+  g_log_set_default_handler(handle, this);
+}
+
+LogCapture::~LogCapture() {
+  g_log_set_default_handler(g_log_default_handler, nullptr);
+  for (const auto &message : messages_) {
+    if (message.level & kWarningOrWorse) {
+      ADD_FAILURE() << "nobody expected this in the log: " << message.text;
+    }
+  }
+}
+
+void LogCapture::handle(const gchar * /*domain*/, GLogLevelFlags level, const gchar *text,
+                        gpointer self) {
+  if (level & G_LOG_FLAG_FATAL) {
+    std::fprintf(stderr, "%s\n", text);  // the process ends now; say why
+  }
+  auto *capture = static_cast<LogCapture *>(self);
+  const std::lock_guard lock(capture->lock_);
+  capture->messages_.push_back({static_cast<GLogLevelFlags>(level & G_LOG_LEVEL_MASK), text});
+}
+
+template <typename Matches>
+bool LogCapture::take_first(Matches matches) {
+  const std::lock_guard lock(lock_);
+  const auto found = std::find_if(messages_.begin(), messages_.end(), matches);
+  if (found == messages_.end()) {
+    return false;
+  }
+  messages_.erase(found);
+  return true;
+}
+
+bool LogCapture::took(GLogLevelFlags level, std::string_view text) {
+  return take_first([&](const auto &m) { return m.level == level && m.text == text; });
+}
+
+bool LogCapture::took_warning(std::string_view text) {
+  return took(G_LOG_LEVEL_WARNING, text);
+}
+
+bool LogCapture::took_critical(std::string_view text) {
+  return took(G_LOG_LEVEL_CRITICAL, text);
+}
+
+bool LogCapture::took_containing(GLogLevelFlags level, std::string_view part) {
+  return take_first(
+      [&](const auto &m) { return m.level == level && m.text.find(part) != std::string::npos; });
+}
+
+std::size_t LogCapture::take_all(GLogLevelFlags level, std::string_view text) {
+  const std::lock_guard lock(lock_);
+  return std::erase_if(messages_,
+                       [&](const auto &m) { return m.level == level && m.text == text; });
+}
+
+void LogCapture::forget() {
+  const std::lock_guard lock(lock_);
+  messages_.clear();
+}

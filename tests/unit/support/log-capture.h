@@ -1,0 +1,44 @@
+// What GLib logs while a capture lives. A test takes the messages that it provokes; a warning, or
+// worse, that nobody took fails the test when the capture ends.
+#pragma once
+
+#include <glib.h>
+
+#include <cstddef>
+#include <mutex>
+#include <string>
+#include <string_view>
+#include <vector>
+
+struct LogMessage {
+  GLogLevelFlags level;
+  std::string text;
+};
+
+// One at a time in a process. Messages may come from any thread.
+class LogCapture {
+ public:
+  LogCapture();
+  ~LogCapture();
+  LogCapture(const LogCapture &) = delete;
+  LogCapture &operator=(const LogCapture &) = delete;
+
+  // Takes the oldest message of that level and text. False: there is none.
+  [[nodiscard]] bool took(GLogLevelFlags level, std::string_view text);
+  [[nodiscard]] bool took_warning(std::string_view text);
+  [[nodiscard]] bool took_critical(std::string_view text);
+  // The same for a part of the text, where the system words the rest.
+  [[nodiscard]] bool took_containing(GLogLevelFlags level, std::string_view part);
+  // Takes every message of that level and text and gives their number.
+  [[nodiscard]] std::size_t take_all(GLogLevelFlags level, std::string_view text);
+  // Takes everything, for tests that are not about what is logged.
+  void forget();
+
+ private:
+  static void handle(const gchar *domain, GLogLevelFlags level, const gchar *text, gpointer self);
+  template <typename Matches>
+  bool take_first(Matches matches);
+
+  std::mutex lock_;
+  std::vector<LogMessage> messages_;
+};
