@@ -16,8 +16,8 @@ struct Backend {
 
 constexpr Backend kBackends[] = {
     {"virtual", 0, virtual_backend_functions},
-    {"gpio", 1, nullptr},
-    {"spiadc", 2, nullptr},
+    {"gpio", 1, gpio_backend_functions},
+    {"spiadc", 2, spiadc_backend_functions},
     {"spi", 3, nullptr},
     {"iio", 4, nullptr},
     {"iio-interrupt", 5, nullptr},

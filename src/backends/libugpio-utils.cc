@@ -1,0 +1,123 @@
+#include "backends/libugpio-utils.h"
+
+#include <cerrno>
+#include <string_view>
+
+#include "base/log.h"
+
+namespace {
+
+constexpr int kDecimal = 10;
+constexpr const char *kLabel = "pin";
+
+// The edges stay alterable, since supervision switches them off and on.
+constexpr unsigned int kInput =
+    UGPIOF_DIR_IN | UGPIOF_TRIG_FALL | UGPIOF_TRIG_RISE | UGPIOF_ALTER_DIR | UGPIOF_ALTER_EDGE;
+constexpr unsigned int kOutputLow = UGPIOF_ALTER_DIR;
+constexpr unsigned int kOutputHigh = UGPIOF_ALTER_DIR | UGPIOF_INIT_HIGH;
+static_assert(kInput == 0x14D && kOutputLow == 0x40 && kOutputHigh == 0x42);
+
+// As printf writes an absent text.
+const char *alias_text(const GpioPin *pin) {
+  return pin->alias ? pin->alias->c_str() : "(null)";
+}
+
+unsigned int request_flags(const GpioPin *pin, bool is_input, bool value) {
+  if (is_input) {
+    return kInput;
+  }
+  return value != (pin->inverted != 0) ? kOutputHigh : kOutputLow;
+}
+
+ugpio_t *request_line(const GpioPin *pin, unsigned int flags) {
+  return pin->alias ? ugpio_request_one_named(pin->alias->c_str(), flags)
+                    : ugpio_request_one(static_cast<unsigned int>(pin->pin), flags, kLabel);
+}
+
+// A library that is not ours may not take a null handle as kindly.
+bool has_handle(const GpioPin *pin) {
+  if (!pin || !pin->handle) {
+    errno = EINVAL;
+    return false;
+  }
+  return true;
+}
+
+}  // namespace
+
+bool libugpio_request_gpio_pin(GpioPin *pin, bool is_input, bool value) {
+  libugpio_close_gpio_pin(pin);
+  pin->handle = request_line(pin, request_flags(pin, is_input, value));
+  if (!pin->handle) {
+    log_warning("Failed to allocate pin %d/%s", pin->pin, alias_text(pin));
+    return false;
+  }
+  if (ugpio_full_open(pin->handle) == -1) {
+    log_warning("Failed to open pin fd!");
+    return false;
+  }
+  if (ugpio_set_activelow(pin->handle, pin->inverted != 0 ? 1 : 0) != 0) {
+    log_warning("Failed set active low!");
+    return false;
+  }
+  return true;
+}
+
+int libugpio_get_gpio_pin(const GpioPin *pin) {
+  return has_handle(pin) ? ugpio_get_value(pin->handle) : -1;
+}
+
+int libugpio_write_gpio_pin(const GpioPin *pin, int value) {
+  return has_handle(pin) ? ugpio_set_value(pin->handle, value) : -1;
+}
+
+bool libugpio_set_gpio_pin(const GpioPin *pin, int value) {
+  g_assert(pin);
+  errno = 0;
+  if (libugpio_write_gpio_pin(pin, value) != -1) {
+    return true;
+  }
+  log_warning("Failed to set gpio pin %s: %s", alias_text(pin), g_strerror(errno));
+  return false;
+}
+
+int libugpio_gpio_pin_fd(const GpioPin *pin) {
+  return has_handle(pin) ? ugpio_fd(pin->handle) : -1;
+}
+
+void libugpio_close_gpio_pin(GpioPin *pin) {
+  if (!pin || !pin->handle) {
+    return;
+  }
+  ugpio_close(pin->handle);
+  ugpio_free(pin->handle);
+  pin->handle = nullptr;
+}
+
+void libugpio_free_gpio_pin(GpioPin *pin) {
+  libugpio_close_gpio_pin(pin);
+  delete pin;
+}
+
+void libugpio_set_gpio_pin_property(GpioPin *pin, const char *key, const char *value) {
+  const std::string_view name = key;
+  if (name == "pin") {
+    pin->pin = static_cast<std::int32_t>(g_ascii_strtoll(value, nullptr, kDecimal));
+  } else if (name == "alias") {
+    pin->alias = value;
+  } else if (name == "inverted") {
+    pin->inverted = std::string_view(value) == "true" ? 1 : 0;
+  }
+}
+
+std::int32_t libugpio_compare_gpio_pin(const GpioPin *a, const GpioPin *b) {
+  return static_cast<std::int32_t>(static_cast<std::uint32_t>(a->pin) -
+                                   static_cast<std::uint32_t>(b->pin));
+}
+
+GpioPin *libugpio_make_gpio_pin(GpioPinPtr &pin) {
+  if (!pin) {
+    pin.reset(new GpioPin);
+  }
+  return pin.get();
+}

@@ -1,0 +1,29 @@
+// What the host implementation of the GPIO library is made of. For its own files and its tests: the
+// daemon knows ugpio/ugpio.h only.
+#pragma once
+
+#include <optional>
+#include <string>
+
+// Where sysfs is found instead of /sys. Before the first request; the daemon never calls it.
+void ugpio_host_set_root(std::string root);
+const std::string &ugpio_host_root();
+
+// The contents of a small attribute file without the line's end, or nothing.
+std::optional<std::string> ugpio_host_read_file(const std::string &path);
+
+// A line as its GPIO character device knows it.
+struct UgpioHostLine {
+  std::string chip;    // the device's name
+  std::string label;   // of the chip
+  unsigned int lines;  // of the chip
+  unsigned int offset;
+};
+
+// The line of that name among the GPIO character devices, the first one where names repeat.
+// Nothing, with errno, when there is none.
+std::optional<UgpioHostLine> ugpio_host_find_line(const char *name);
+
+// The number by which sysfs knows the line. Nothing, with errno, when sysfs has no chip for it, or
+// several that can't be told apart.
+std::optional<unsigned int> ugpio_host_line_number(const UgpioHostLine &line);

@@ -1,0 +1,327 @@
+// The GPIO library over sysfs.
+#include <fcntl.h>
+#include <glib.h>
+#include <sys/stat.h>
+#include <ugpio/ugpio.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <memory>
+#include <string_view>
+#include <utility>
+
+#include "base/log.h"
+#include "base/unique-fd.h"
+#include "platform/host/ugpio-host.h"
+
+struct Ugpio {
+  unsigned int number = 0;
+  bool exported = false;  // by this context, so it takes the export back
+  bool input = false;
+  // Until then (monotonic, in microseconds) a missing or forbidden file is waited for.
+  gint64 settle_deadline = 0;
+  UniqueFd value;
+};
+
+namespace {
+
+// The kernel has the files of an exported line ready at once. The rights that a rule of the device
+// manager gives to them come a moment later.
+constexpr gint64 kSettleTime = 500 * G_TIME_SPAN_MILLISECOND;
+constexpr gulong kSettlePoll = G_TIME_SPAN_MILLISECOND;
+
+constexpr std::size_t kAttributeSize = 64;
+
+std::string &root() {
+  static std::string path = "/sys";
+  return path;
+}
+
+// Cleaning up after a failure must not hide why it failed.
+class ErrnoKeeper {
+ public:
+  ErrnoKeeper() = default;
+  ErrnoKeeper(const ErrnoKeeper &) = delete;
+  ErrnoKeeper &operator=(const ErrnoKeeper &) = delete;
+  ~ErrnoKeeper() { errno = errno_; }
+
+ private:
+  int errno_ = errno;
+};
+
+int fail(int code) {
+  errno = code;
+  return -1;
+}
+
+template <typename Call>
+auto uninterrupted(Call call) {
+  auto result = call();
+  while (result < 0 && errno == EINTR) {
+    result = call();
+  }
+  return result;
+}
+
+std::string class_path(std::string_view file) {
+  return root() + "/class/gpio/" + std::string(file);
+}
+
+std::string line_path(const ugpio_t &context) {
+  return class_path("gpio" + std::to_string(context.number));
+}
+
+UniqueFd open_file(const std::string &path, int flags) {
+  return UniqueFd(uninterrupted([&] { return open(path.c_str(), flags | O_CLOEXEC); }));
+}
+
+bool may_settle(const ugpio_t &context, int code) {
+  return (code == ENOENT || code == EACCES) && g_get_monotonic_time() < context.settle_deadline;
+}
+
+UniqueFd open_attribute(const ugpio_t &context, const char *name, int flags) {
+  const std::string path = line_path(context) + "/" + name;
+  UniqueFd fd = open_file(path, flags);
+  while (!fd && may_settle(context, errno)) {
+    g_usleep(kSettlePoll);
+    fd = open_file(path, flags);
+  }
+  return fd;
+}
+
+// An attribute takes its text in one piece or not at all.
+bool write_text(const UniqueFd &fd, std::string_view text) {
+  if (!fd) {
+    return false;
+  }
+  const ssize_t written = uninterrupted([&] { return write(fd.get(), text.data(), text.size()); });
+  if (written >= 0 && static_cast<std::size_t>(written) != text.size()) {
+    errno = EIO;
+  }
+  return written >= 0 && static_cast<std::size_t>(written) == text.size();
+}
+
+bool write_attribute(const ugpio_t &context, const char *name, std::string_view text) {
+  return write_text(open_attribute(context, name, O_WRONLY | O_TRUNC), text);
+}
+
+bool write_number(const char *file, unsigned int number) {
+  return write_text(open_file(class_path(file), O_WRONLY | O_TRUNC), std::to_string(number));
+}
+
+// --- Taking and giving back ---
+
+bool is_exported(const ugpio_t &context) {
+  struct stat status {};
+  return stat(line_path(context).c_str(), &status) == 0;
+}
+
+bool export_line(ugpio_t &context) {
+  if (is_exported(context)) {
+    return true;
+  }
+  if (write_number("export", context.number)) {
+    context.exported = true;
+    context.settle_deadline = g_get_monotonic_time() + kSettleTime;
+    return true;
+  }
+  // Busy may also mean that another process exported the line since we looked.
+  const ErrnoKeeper keeper;
+  return errno == EBUSY && is_exported(context);
+}
+
+struct GiveBack {
+  void operator()(ugpio_t *context) const {
+    const ErrnoKeeper keeper;
+    context->value.reset();
+    if (context->exported) {
+      (void)write_number("unexport", context->number);
+    }
+    delete context;
+  }
+};
+using ContextPtr = std::unique_ptr<ugpio_t, GiveBack>;
+
+ContextPtr take(unsigned int gpio) {
+  ContextPtr context(new ugpio_t);
+  context->number = gpio;
+  if (!export_line(*context)) {
+    context.reset();
+  }
+  return context;
+}
+
+// --- Direction and edges ---
+
+const char *edge_word(unsigned int flags) {
+  const bool falling = (flags & UGPIOF_TRIG_FALL) != 0;
+  const bool rising = (flags & UGPIOF_TRIG_RISE) != 0;
+  if (falling && rising) {
+    return "both";
+  }
+  return falling ? "falling" : "rising";
+}
+
+// A line that can't interrupt has no such file. It can still be read, which is better than no line.
+bool set_edges(const ugpio_t &context, unsigned int flags) {
+  if (write_attribute(context, "edge", edge_word(flags))) {
+    return true;
+  }
+  if (errno != ENOENT) {
+    return false;
+  }
+  log_warning("GPIO %u can't signal edges: its changes go unseen", context.number);
+  return true;
+}
+
+// Edges that an earlier user left on would keep the line from becoming an output.
+bool clear_edges(const ugpio_t &context) {
+  const auto edges = ugpio_host_read_file(line_path(context) + "/edge");
+  return !edges || edges->empty() || edges == "none" || write_attribute(context, "edge", "none");
+}
+
+bool make_input(ugpio_t &context, unsigned int flags) {
+  context.input = true;
+  if (!write_attribute(context, "direction", "in")) {
+    return false;
+  }
+  const bool triggers = (flags & (UGPIOF_TRIG_FALL | UGPIOF_TRIG_RISE)) != 0;
+  return triggers ? set_edges(context, flags) : clear_edges(context);
+}
+
+bool make_output(const ugpio_t &context, unsigned int flags) {
+  const bool high = (flags & UGPIOF_INIT_HIGH) != 0;
+  return clear_edges(context) && write_attribute(context, "direction", high ? "high" : "low");
+}
+
+bool configure(ugpio_t &context, unsigned int flags) {
+  return (flags & UGPIOF_DIR_IN) != 0 ? make_input(context, flags) : make_output(context, flags);
+}
+
+// --- Values ---
+
+UniqueFd open_value(const ugpio_t &context) {
+  if (!context.input) {
+    UniqueFd fd = open_attribute(context, "value", O_RDWR);
+    if (fd || errno != EACCES) {
+      return fd;
+    }
+  }
+  return open_attribute(context, "value", O_RDONLY);
+}
+
+int parse_level(char level) {
+  if (level != '0' && level != '1') {
+    return fail(EIO);
+  }
+  return level == '1' ? 1 : 0;
+}
+
+int read_level(int fd) {
+  std::array<char, kAttributeSize> text{};
+  const ssize_t length = uninterrupted([&] { return pread(fd, text.data(), text.size(), 0); });
+  return length < 0 ? -1 : parse_level(text.front());
+}
+
+std::optional<unsigned int> number_of(const char *name) {
+  if (!name) {
+    errno = EINVAL;
+    return std::nullopt;
+  }
+  const auto line = ugpio_host_find_line(name);
+  return line ? ugpio_host_line_number(*line) : std::nullopt;
+}
+
+}  // namespace
+
+void ugpio_host_set_root(std::string root_path) {
+  root() = std::move(root_path);
+}
+
+const std::string &ugpio_host_root() {
+  return root();
+}
+
+std::optional<std::string> ugpio_host_read_file(const std::string &path) {
+  const UniqueFd fd = open_file(path, O_RDONLY);
+  std::array<char, kAttributeSize> text{};
+  const ssize_t length =
+      fd ? uninterrupted([&] { return read(fd.get(), text.data(), text.size()); }) : -1;
+  if (length < 0) {
+    return std::nullopt;
+  }
+  const std::string_view contents(text.data(), static_cast<std::size_t>(length));
+  return std::string(contents.substr(0, contents.find('\n')));
+}
+
+ugpio_t *ugpio_request(unsigned int gpio, const char * /*label*/) {
+  return take(gpio).release();
+}
+
+ugpio_t *ugpio_request_named(const char *name) {
+  const auto number = number_of(name);
+  return number ? ugpio_request(*number, name) : nullptr;
+}
+
+ugpio_t *ugpio_request_one(unsigned int gpio, unsigned int flags, const char * /*label*/) {
+  ContextPtr context = take(gpio);
+  if (context && !configure(*context, flags)) {
+    context.reset();
+  }
+  return context.release();
+}
+
+ugpio_t *ugpio_request_one_named(const char *name, unsigned int flags) {
+  const auto number = number_of(name);
+  return number ? ugpio_request_one(*number, flags, name) : nullptr;
+}
+
+int ugpio_full_open(ugpio_t *context) {
+  if (!context) {
+    return fail(EINVAL);
+  }
+  context->value = open_value(*context);
+  if (!context->value) {
+    return -1;
+  }
+  // A fresh descriptor signals an edge until its first read, whether there was one or not.
+  (void)read_level(context->value.get());
+  return 0;
+}
+
+int ugpio_set_activelow(ugpio_t *context, int activelow) {
+  if (!context) {
+    return fail(EINVAL);
+  }
+  return write_attribute(*context, "active_low", activelow != 0 ? "1" : "0") ? 0 : -1;
+}
+
+int ugpio_get_value(ugpio_t *context) {
+  return context ? read_level(context->value.get()) : fail(EINVAL);
+}
+
+int ugpio_set_value(ugpio_t *context, int value) {
+  if (!context) {
+    return fail(EINVAL);
+  }
+  const char level = value != 0 ? '1' : '0';
+  return uninterrupted([&] { return pwrite(context->value.get(), &level, 1, 0); }) < 0 ? -1 : 0;
+}
+
+int ugpio_fd(ugpio_t *context) {
+  if (!context) {
+    return fail(EINVAL);
+  }
+  return context->value ? context->value.get() : fail(EBADF);
+}
+
+void ugpio_close(ugpio_t *context) {
+  if (context) {
+    context->value.reset();
+  }
+}
+
+void ugpio_free(ugpio_t *context) {
+  const ContextPtr released(context);
+}
