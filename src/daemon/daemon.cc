@@ -23,6 +23,8 @@
 #include "port/ioport.h"
 #include "port/port-registry.h"
 #include "settings/param.h"
+#include "supervised/iosupervised.h"
+#include "supervised/supervised-backends.h"
 
 namespace {
 
@@ -53,6 +55,7 @@ void install_signal_sources(Daemon &daemon) {
 
 void load_hardware_description() {
   backends_register();
+  supervised_backends_register();
   hwdesc_load_file(kHardwareDescription);
   hwdesc_load_directory(kHardwareFragments);
 }
@@ -120,12 +123,14 @@ void start_manual_triggers() {
 void go_public() {
   io_events_start();
   iocontrol_state_start();
+  iosupervised_start();
   port_registry_arm_watches();
   port_registry_declare_events();
   start_manual_triggers();
 }
 
 void shut_down(Daemon &daemon) {
+  iosupervised_stop();
   iocontrol_state_stop();
   manual_trigger_clear();
   manual_trigger_stop();

@@ -4,7 +4,7 @@
 #include <vector>
 
 #include "base/glib-ptr.h"
-#include "dbus/own-name.h"
+#include "base/own-name.h"
 #include "pcd-connector-gen.h"
 #include "port/ioport.h"
 #include "port/port-registry.h"

@@ -4,10 +4,10 @@
 
 #include "base/glib-ptr.h"
 #include "base/log.h"
+#include "base/own-name.h"
 #include "dbus/connector.h"
 #include "dbus/error-domain.h"
 #include "dbus/iocontrol-handlers.h"
-#include "dbus/own-name.h"
 #include "iocontrol-state-gen.h"
 #include "port/port-listener.h"
 

@@ -3,7 +3,6 @@
 #include <string_view>
 #include <vector>
 
-#include "backends/backends.h"
 #include "base/glib-ptr.h"
 #include "base/log.h"
 #include "hwdesc/hardware-id.h"
@@ -153,7 +152,7 @@ void apply_backend(IOPort *ioport, const Attribute &attribute) {
   if (attribute.name != "name") {
     return;
   }
-  if (const auto kind = backend_kind_from_word(attribute.value)) {
+  if (const auto kind = io_port_backend_kind(attribute.value)) {
     io_port_set_backend(ioport, *kind);
   } else {
     log_warning("Port %s: no backend is called %s", io_port_describe(ioport), attribute.value);

@@ -82,6 +82,5 @@ void io_port_destroy(IOPort *ioport);
 // Sends those events of the port that apply to its role, while its events are enabled.
 void io_port_fire_events(IOPort *ioport, std::int32_t state);
 void io_port_undeclare_events(IOPort *ioport);
-void io_port_redeclare_events(IOPort *ioport);
 // Declares the events that apply to the port's role and withdraws the others.
 void io_port_declare_events_for_role(IOPort *ioport);

@@ -1,6 +1,7 @@
 // Lifetime, backend binding and identity of a port.
 #include "port/ioport.h"
 
+#include <algorithm>
 #include <array>
 
 #include "base/log.h"
@@ -11,9 +12,14 @@ namespace {
 
 constexpr int kBackendKinds = 10;
 
-std::array<MakePortFunctions, kBackendKinds> &backend_makers() {
-  static std::array<MakePortFunctions, kBackendKinds> makers{};
-  return makers;
+struct Backend {
+  MakePortFunctions make = nullptr;
+  const char *word = nullptr;
+};
+
+std::array<Backend, kBackendKinds> &backends() {
+  static std::array<Backend, kBackendKinds> table{};
+  return table;
 }
 
 bool kind_in_range(int kind) {
@@ -21,7 +27,7 @@ bool kind_in_range(int kind) {
 }
 
 void install_backend(IOPort *ioport) {
-  const MakePortFunctions make = backend_makers().at(static_cast<size_t>(ioport->backend));
+  const MakePortFunctions make = backends().at(static_cast<size_t>(ioport->backend)).make;
   if (make) {
     ioport->functions = make(ioport);
   }
@@ -49,9 +55,12 @@ void rebuild_released_backend(IOPort *ioport) {
   }
   ioport->backend_released = false;
   install_backend(ioport);
+  // The description's ranges are only the first ones; the user may have set others since.
+  const SupervisedRanges ranges = ioport->supervised_ranges;
   for (const auto &property : ioport->backend_properties) {
     apply_backend_property(ioport, property);
   }
+  ioport->supervised_ranges = ranges;
 }
 
 }  // namespace
@@ -84,10 +93,24 @@ void io_port_destroy(IOPort *ioport) {
   delete ioport;
 }
 
-void io_port_register_backend(int kind, MakePortFunctions make) {
-  if (kind_in_range(kind)) {
-    backend_makers().at(static_cast<size_t>(kind)) = make;
+void io_port_register_backend(int kind, MakePortFunctions make, const char *word) {
+  if (!kind_in_range(kind)) {
+    return;
   }
+  Backend &backend = backends().at(static_cast<size_t>(kind));
+  backend.make = make;
+  if (word) {
+    backend.word = word;
+  }
+}
+
+std::optional<int> io_port_backend_kind(std::string_view word) {
+  const auto &table = backends();
+  const auto *const found = std::find_if(table.begin(), table.end(), [&](const Backend &backend) {
+    return backend.word && backend.word == word;
+  });
+  return found == table.end() ? std::nullopt
+                              : std::optional<int>(static_cast<int>(found - table.begin()));
 }
 
 void io_port_set_backend(IOPort *ioport, int kind) {

@@ -12,6 +12,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <utility>
 #include <vector>
 
@@ -47,9 +48,12 @@ using IOPortRef = std::unique_ptr<IOPort, IOPortUnref>;
 // --- Backend ------------------------------------------------------------------------------------
 
 // Makes the backend's table known, with the operation that installs it: that gives the port its
-// private record if it has none. Kinds outside 0 to 9 are ignored.
+// private record if it has none. `word`, a literal, is what the hardware description calls the
+// backend; none keeps the word that the kind has. Kinds outside 0 to 9 are ignored.
 using MakePortFunctions = const PortFunctions *(*)(IOPort *port);
-void io_port_register_backend(int kind, MakePortFunctions make);
+void io_port_register_backend(int kind, MakePortFunctions make, const char *word = nullptr);
+// The kind for a word of the hardware description, compared exactly.
+std::optional<int> io_port_backend_kind(std::string_view word);
 // Chooses the backend. A kind that nobody registered leaves the port without a table.
 void io_port_set_backend(IOPort *ioport, int kind);
 int io_port_get_backend(const IOPort *ioport);
@@ -213,6 +217,8 @@ bool io_port_events_enabled(const IOPort *ioport);  // any thread
 void io_port_set_events_enabled(IOPort *ioport, bool enabled);
 // Declares every event of the port; needs a backend. What can't be declared is logged.
 void io_port_declare_events(IOPort *ioport);
+// Withdraws every event and declares those that apply, since what they say of the port has changed.
+void io_port_redeclare_events(IOPort *ioport);
 void io_port_reset_event_filters(IOPort *ioport);
 // Whether one of the port's events is the shared any-port event. False while events are off.
 bool io_port_got_port_any(IOPort *ioport);

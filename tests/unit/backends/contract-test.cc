@@ -78,7 +78,7 @@ INSTANTIATE_TEST_SUITE_P(Every, Backend, testing::ValuesIn(kBackends), word_of);
 // --- The table ---
 
 TEST_P(Backend, IsKnownByItsWordAndKind) {
-  EXPECT_EQ(backend_kind_from_word(GetParam().word), GetParam().kind);
+  EXPECT_EQ(io_port_backend_kind(GetParam().word), GetParam().kind);
   const auto port = described();
   EXPECT_TRUE(io_port_has_backend(port.get()));
   EXPECT_EQ(io_port_get_backend(port.get()), GetParam().kind);

@@ -40,7 +40,7 @@ class PortTest : public testing::Test {
     io_port_set_id(port_.get(), "terminal");
     io_port_set_type(port_.get(), type);
     io_port_restore_direction(port_.get(), type != PORT_OUTPUT);
-    io_port_set_backend(port_.get(), backend_kind_from_word(backend).value());
+    io_port_set_backend(port_.get(), io_port_backend_kind(backend).value());
     for (const auto &property : properties) {
       io_port_set_backend_property(port_.get(), property.section, property.key, property.value);
     }

@@ -1,4 +1,4 @@
-#include "dbus/own-name.h"
+#include "base/own-name.h"
 
 #include "base/glib-ptr.h"
 #include "base/log.h"

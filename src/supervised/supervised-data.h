@@ -1,0 +1,38 @@
+// What the private records of all supervised backends begin with: the pins, and how the line is
+// watched.
+#pragma once
+
+#include <mutex>
+
+#include "backends/libugpio-utils.h"
+#include "base/source.h"
+#include "port/ioport.h"
+
+struct SupervisedData : PortBackendData {
+  GpioPinPtr io_ctrl;   // 1: the plain input path is connected
+  GpioPinPtr sio_ctrl;  // 1: the line goes to the converter
+  GpioPinPtr input;
+  GpioPinPtr output;
+  int io_ctrl_level = -1;  // the last one driven; -1: none
+  // For the pins' handles, since action threads drive the output, and for `seen` and `settling`.
+  // Nothing else is locked while it is held.
+  std::mutex pins_lock;
+
+  // What the plain pin read last while its edges were watched; -1: nothing yet.
+  int seen = -1;
+  bool settling = false;  // its changes are being read and reported
+  Source edge_watch;
+  Source edge_recheck;  // the pin must be looked at without an edge
+
+  Source poll;
+  // The entry of this port in what would be a table by port number. Held here it serves every
+  // number, and ports that share one leave each other's alone.
+  SupervisedRangeState last_state = SUPERVISED_STATE_UNDEFINED;
+
+  bool supervised = false;   // the last value given to set_supervised
+  bool initialised = false;  // set-up has succeeded and the port was not dropped since
+};
+
+inline SupervisedData *supervised_data(IOPort *port) {
+  return static_cast<SupervisedData *>(io_port_backend_data(port));
+}

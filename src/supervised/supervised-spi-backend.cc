@@ -1,0 +1,172 @@
+// Supervised inputs on an SPI converter that is read on demand.
+#include <fcntl.h>
+#include <linux/spi/spidev.h>
+#include <sys/ioctl.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <map>
+#include <string>
+#include <string_view>
+
+#include "backends/spi-sample.h"
+#include "base/log.h"
+#include "base/unique-fd.h"
+#include "port/port-error.h"
+#include "supervised/range-property.h"
+#include "supervised/supervised-backends.h"
+#include "supervised/supervised-data.h"
+#include "supervised/supervised-edge-watch.h"
+#include "supervised/supervised-parts.h"
+#include "supervised/supervised-pins.h"
+#include "supervised/supervised-utils.h"
+
+namespace {
+
+struct SpiSupervisedData : SupervisedData {
+  std::string path;          // of the spidev node
+  std::uint32_t speed = 0;   // hertz; 0: the device's default
+  std::uint8_t address = 0;  // tells the converter what to measure
+  UniqueFd fd;
+};
+
+PendingRange pending_range;
+
+// Freeing a port leaves its device open. The descriptor waits here for the next port on that
+// device, so that there is never more than one left over for each.
+std::map<std::string, UniqueFd> &left_open() {
+  static std::map<std::string, UniqueFd> descriptors;
+  return descriptors;
+}
+
+SpiSupervisedData *data_of(IOPort *port) {
+  return static_cast<SpiSupervisedData *>(io_port_backend_data(port));
+}
+
+bool spi_set_control_pins(IOPort *port) {
+  if (io_port_get_type(port) == PORT_OUTPUT) {
+    g_assertion_message_expr(G_LOG_DOMAIN, __FILE__, __LINE__, __func__,
+                             "port->type == PORT_INPUT");
+  }
+  return supervised_drive_control_pins(port, supervised_control_levels(port));
+}
+
+// --- Set-up ---
+
+bool open_device(SpiSupervisedData *data) {
+  data->fd.reset(open(data->path.c_str(), O_RDWR | O_CLOEXEC));
+  left_open().erase(data->path);
+  if (!data->fd) {
+    log_critical("Failed to open SPI device.");
+    return false;
+  }
+  std::uint8_t bits_per_word = 8;
+  if (ioctl(data->fd.get(), SPI_IOC_WR_BITS_PER_WORD, &bits_per_word) < 0) {
+    log_critical("Failed to set bits per word.");
+    return false;
+  }
+  if (data->speed != 0 && ioctl(data->fd.get(), SPI_IOC_WR_MAX_SPEED_HZ, &data->speed) < 0) {
+    log_critical("Failed to set max speed.");
+    return false;
+  }
+  return true;
+}
+
+bool spi_setup_line(IOPort *port) {
+  if (open_device(data_of(port))) {
+    return true;
+  }
+  log_critical("Failed to open spi device.");
+  return false;
+}
+
+constexpr SupervisedParts kParts = {
+    .sio_ctrl_optional = false,
+    .set_control_pins = spi_set_control_pins,
+    .setup_line = spi_setup_line,
+    .set_line_watch = supervised_set_poll,
+};
+
+bool spi_setup(IOPort *port, bool initial_level) {
+  return supervised_setup(port, initial_level, kParts);
+}
+
+// --- Operations ---
+
+bool set_supervised(IOPort *port, bool supervised) {
+  return supervised_switch(port, supervised, supervised, kParts);
+}
+
+// A transfer that failed costs the device until the port is set up again.
+bool get_supervised_readout(IOPort *port, SupervisedRangeState *state, std::uint32_t *level,
+                            GError **error) {
+  SpiSupervisedData *data = data_of(port);
+  *state = SUPERVISED_STATE_UNDEFINED;
+  const auto sample = spi_read_sample(data->fd.get(), data->address);
+  if (!sample) {
+    const char *reason = g_strerror(errno);
+    log_critical("Error: %s", reason);
+    data->fd.reset();
+    g_set_error_literal(error, io_supervised_error_quark(), IO_SUPERVISED_ERROR_GENERIC, reason);
+    return false;
+  }
+  *level = static_cast<std::uint32_t>(*sample);
+  return supervised_classify_for_port(port, *level, state, error);
+}
+
+void set_direction(IOPort *port, bool input) {
+  (void)supervised_turn(port, input, kParts);
+}
+
+void set_device_property(SpiSupervisedData *data, std::string_view section, std::string_view key,
+                         const char *value) {
+  unsigned int address = 0;
+  if (section == "address" && std::sscanf(value, "%x", &address) == 1) {
+    data->address = static_cast<std::uint8_t>(address);
+  } else if (section == "device" && key == "path") {
+    data->path = value;
+  } else if (section == "speed" && key == "value") {
+    data->speed = static_cast<std::uint32_t>(g_ascii_strtoull(value, nullptr, 0));
+  }
+}
+
+void set_property(IOPort *port, const char *section, const char *key, const char *value) {
+  auto *data = io_port_make_backend_data<SpiSupervisedData>(port);
+  if (supervised_set_pin_property(port, section, key, value)) {
+    return;
+  }
+  if (std::string_view(section) == "range") {
+    range_property_apply(&pending_range, port, key, value);
+  } else {
+    set_device_property(data, section, key, value);
+  }
+}
+
+void free_data(IOPort *port) {
+  if (SpiSupervisedData *data = data_of(port); data && data->fd) {
+    left_open()[data->path] = std::move(data->fd);
+  }
+  io_port_set_backend_data(port, nullptr);
+}
+
+constexpr PortFunctions kFunctions = {
+    .setup = spi_setup,
+    .is_supervisable = supervised_is_supervisable,
+    .set_supervised = set_supervised,
+    .get_supervised_ranges = supervised_ranges_get,
+    .set_supervised_ranges = supervised_ranges_set,
+    .get_supervised_readout = get_supervised_readout,
+    .get_state = supervised_pin_level,
+    .set_state = supervised_set_state,
+    .start_watch = supervised_update_watch,
+    .set_direction = set_direction,
+    .set_property = set_property,
+    .free = free_data,
+};
+
+}  // namespace
+
+const PortFunctions *supervised_spi_backend_functions(IOPort *port) {
+  io_port_make_backend_data<SpiSupervisedData>(port);
+  return &kFunctions;
+}

@@ -1,0 +1,220 @@
+#include "support/bench.h"
+
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <filesystem>
+#include <fstream>
+#include <mutex>
+#include <sstream>
+#include <utility>
+
+#include "backends/backends.h"
+#include "platform/host/ugpio-host.h"
+#include "port/port-listener.h"
+#include "supervised/supervised-backends.h"
+
+namespace {
+
+struct Timer {
+  guint id;
+  guint interval;
+};
+
+std::vector<Timer> all_timers;
+std::vector<std::string> all_reports;
+std::vector<std::string> all_logged;
+std::vector<std::string> broken_files;
+
+bool is_broken(int fd) {
+  std::error_code error;
+  const auto file = std::filesystem::read_symlink("/proc/self/fd/" + std::to_string(fd), error);
+  errno = EIO;
+  return std::find(broken_files.begin(), broken_files.end(), file.string()) != broken_files.end();
+}
+
+bool armed(const Timer &timer) {
+  return g_main_context_find_source_by_id(nullptr, timer.id) != nullptr;
+}
+
+void forget_dead_timers() {
+  std::erase_if(all_timers, [](const Timer &timer) { return !armed(timer); });
+}
+
+const char *level_word(GLogLevelFlags level) {
+  switch (level & G_LOG_LEVEL_MASK) {
+    case G_LOG_LEVEL_CRITICAL:
+      return "critical";
+    case G_LOG_LEVEL_WARNING:
+      return "warning";
+    default:
+      return "info";
+  }
+}
+
+void on_log(const gchar * /*domain*/, GLogLevelFlags level, const gchar *text,
+            gpointer /*user_data*/) {
+  all_logged.push_back(std::string(level_word(level)) + ": " + text);
+}
+
+void on_port_changed(const PortChange &change) {
+  all_reports.push_back(std::to_string(change.number) + (change.state ? " on" : " off"));
+}
+
+void on_send_event(IOPort * /*port*/, IoEvent * /*event*/, std::int32_t state) {
+  all_reports.push_back("event " + std::to_string(state));
+}
+
+}  // namespace
+
+// The daemon's timers run on the main loop's clock. Here the test is the clock: a timer is a source
+// that gets ready only when the test makes it.
+extern "C" guint g_timeout_add(guint interval, GSourceFunc function, gpointer data) {
+  GSource *source = g_timeout_source_new(G_MAXINT);
+  g_source_set_callback(source, function, data, nullptr);
+  const guint id = g_source_attach(source, nullptr);
+  g_source_unref(source);
+  all_timers.push_back({id, interval});
+  return id;
+}
+
+// GPIO lines are read and driven with these two.
+extern "C" ssize_t pread64(int fd, void *buffer, size_t size, off64_t offset) {
+  return is_broken(fd) ? -1 : syscall(SYS_pread64, fd, buffer, size, offset);
+}
+
+extern "C" ssize_t pwrite64(int fd, const void *buffer, size_t size, off64_t offset) {
+  return is_broken(fd) ? -1 : syscall(SYS_pwrite64, fd, buffer, size, offset);
+}
+
+extern "C" void g_usleep(gulong /*microseconds*/) {}
+
+Bench::Bench() {
+  root_ = testing::TempDir() + "portd-bench-XXXXXX";
+  g_assert(mkdtemp(root_.data()));
+  std::filesystem::create_directories(path("class/gpio"));
+  ugpio_host_set_root(root_);
+  g_log_set_default_handler(on_log, nullptr);
+  all_reports.clear();
+  all_logged.clear();
+  port_listener() = {};
+  port_listener().port_changed = on_port_changed;
+  port_listener().send_event = on_send_event;
+  backends_register();
+  supervised_backends_register();
+}
+
+Bench::~Bench() {
+  mend_lines();
+  std::error_code ignored;
+  std::filesystem::remove_all(root_, ignored);
+}
+
+void Bench::write(std::string_view name, std::string_view text) const {
+  const std::filesystem::path file = path(name);
+  std::filesystem::create_directories(file.parent_path());
+  std::ofstream(file) << text;
+}
+
+std::string Bench::read(std::string_view name) const {
+  std::ifstream file(path(name));
+  if (!file || std::filesystem::is_directory(path(name))) {
+    return "(none)";
+  }
+  std::ostringstream text;
+  text << file.rdbuf();
+  return text.str();
+}
+
+void Bench::remove(std::string_view name) const {
+  std::filesystem::remove_all(path(name));
+}
+
+void Bench::block(std::string_view name) const {
+  remove(name);
+  std::filesystem::create_directories(path(name));
+}
+
+void Bench::make_line(int number) const {
+  const std::string folder = "class/gpio/gpio" + std::to_string(number) + "/";
+  write(folder + "direction", "in\n");
+  write(folder + "edge", "none\n");
+  write(folder + "active_low", "0\n");
+  write(folder + "value", "0\n");
+}
+
+void Bench::set_line(int number, bool level) const {
+  write("class/gpio/gpio" + std::to_string(number) + "/value", level ? "1\n" : "0\n");
+}
+
+bool Bench::line(int number) const {
+  return read("class/gpio/gpio" + std::to_string(number) + "/value").front() == '1';
+}
+
+void Bench::break_line(int number) const {
+  broken_files.push_back(path("class/gpio/gpio" + std::to_string(number) + "/value"));
+}
+
+void Bench::mend_lines() {
+  broken_files.clear();
+}
+
+IOPortRef Bench::make_port(int kind, PortType type, const std::vector<Property> &properties) {
+  IOPortRef port(io_port_new());
+  io_port_set_type(port.get(), type);
+  io_port_restore_direction(port.get(), io_port_direction_input(port.get()));
+  io_port_set_id(port.get(), "line");
+  io_port_set_number(port.get(), 1);
+  io_port_restore_name(port.get(), "Line", true);
+  io_port_set_backend(port.get(), kind);
+  for (const auto &property : properties) {
+    io_port_set_backend_property(port.get(), property.section, property.key,
+                                 property.value.c_str());
+  }
+  return port;
+}
+
+SupervisedRanges Bench::ranges_of(const IOPortRef &port) {
+  SupervisedRanges ranges;
+  EXPECT_TRUE(io_port_get_supervised_ranges(port.get(), &ranges));
+  return ranges;
+}
+
+std::vector<std::string> Bench::reports() {
+  return std::exchange(all_reports, {});
+}
+
+std::vector<std::string> Bench::logged() {
+  return std::exchange(all_logged, {});
+}
+
+bool Bench::was_logged(std::string_view line) {
+  return std::find(all_logged.begin(), all_logged.end(), line) != all_logged.end();
+}
+
+void Bench::iterate() {
+  while (g_main_context_iteration(nullptr, FALSE)) {
+  }
+}
+
+std::vector<guint> Bench::timers() {
+  forget_dead_timers();
+  std::vector<guint> intervals;
+  for (const auto &timer : all_timers) {
+    intervals.push_back(timer.interval);
+  }
+  return intervals;
+}
+
+void Bench::expire(guint interval) {
+  forget_dead_timers();
+  for (const auto &timer : std::vector<Timer>(all_timers)) {
+    GSource *source = g_main_context_find_source_by_id(nullptr, timer.id);
+    if (source && timer.interval == interval) {
+      g_source_set_ready_time(source, 0);
+    }
+  }
+  iterate();
+}

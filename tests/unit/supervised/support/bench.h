@@ -1,0 +1,71 @@
+// A bench for supervised ports: a sysfs tree with GPIO lines in a folder of its own, timers that
+// only run when the test says so, and everything that is logged or reported written down.
+#pragma once
+
+#include <glib.h>
+#include <gtest/gtest.h>
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "port/ioport.h"
+
+inline constexpr int kSpiKind = 3;
+inline constexpr int kIioKind = 4;
+inline constexpr int kIioInterruptKind = 5;
+
+// One attribute of the hardware description.
+struct Property {
+  const char *section;
+  const char *key;
+  std::string value;
+};
+
+class Bench : public testing::Test {
+ protected:
+  Bench();
+  ~Bench() override;
+  Bench(const Bench &) = delete;
+  Bench &operator=(const Bench &) = delete;
+
+  // --- Files, all below the bench's folder ---
+  std::string path(std::string_view name) const { return root_ + "/" + std::string(name); }
+  void write(std::string_view name, std::string_view text) const;
+  // What the file holds; "(none)" when there is no such file.
+  std::string read(std::string_view name) const;
+  void remove(std::string_view name) const;
+  // Puts a directory where the file is, which nothing can write then, or takes it away again.
+  void block(std::string_view name) const;
+
+  // --- GPIO lines ---
+  void make_line(int number) const;
+  void set_line(int number, bool level) const;
+  bool line(int number) const;
+  // From now on the line can neither be read nor driven, also through open descriptors.
+  void break_line(int number) const;
+  static void mend_lines();
+
+  // --- Ports ---
+  // A port with its backend bound and the properties applied, numbered 1.
+  static IOPortRef make_port(int kind, PortType type, const std::vector<Property> &properties);
+  static SupervisedRanges ranges_of(const IOPortRef &port);
+
+  // --- Reports: "1 on" for PortChanged of port 1, "event 3" for an event sent with state 3 ---
+  static std::vector<std::string> reports();
+
+  // --- The log: "critical: text" ---
+  static std::vector<std::string> logged();
+  static bool was_logged(std::string_view line);
+
+  // --- The main loop ---
+  // Runs what is ready.
+  static void iterate();
+  // The intervals of the armed timers, oldest first.
+  static std::vector<guint> timers();
+  // Lets every armed timer of that interval expire once.
+  static void expire(guint interval);
+
+  std::string root_;
+};
