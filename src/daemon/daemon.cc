@@ -19,6 +19,7 @@
 #include "platform/kv-log.h"
 #include "port/ioport.h"
 #include "port/port-registry.h"
+#include "settings/param-legacy.h"
 #include "settings/param.h"
 
 namespace {
@@ -80,6 +81,13 @@ bool read_settings() {
   return true;
 }
 
+void import_legacy_export() {
+  if (legacy_export_present()) {
+    Error ignored;  // what could be read counts, and older firmware can't be told of the rest
+    param_import_parhand(kLegacyExport, ignored.out());
+  }
+}
+
 // Once before the settings are stored and, for a file that this start has made, once after: what
 // root leaves behind, the service account must be able to read and replace.
 void store_settings() {
@@ -87,6 +95,7 @@ void store_settings() {
   if (existed) {
     param_chown_to_service_user(kSettingsFile);
   }
+  import_legacy_export();
   port_registry_assign_default_names();
   param_save_all(kSettingsFile);
   if (!existed && access(kSettingsFile, F_OK) == 0) {
