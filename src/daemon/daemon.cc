@@ -14,7 +14,10 @@
 #include "base/source.h"
 #include "daemon/paths.h"
 #include "daemon/privileges.h"
+#include "dbus/iocontrol-conf-legacy-dbus.h"
 #include "dbus/iocontrol-state.h"
+#include "dbus/legacy-interface.h"
+#include "dbus/legacy-mappings.h"
 #include "hwdesc/hwdesc.h"
 #include "platform/kv-log.h"
 #include "port/ioport.h"
@@ -29,6 +32,12 @@ struct Daemon {
   Source sigterm;
   Source sighup;
 };
+
+void read_arguments(int argc, char **argv) {
+  if (argc > 1 && std::string_view(argv[1]) == "--disable_legacy_interface") {
+    legacy_interface_disable();
+  }
+}
 
 // Both signals arrive as main-loop sources, so logging and quitting are safe here.
 gboolean on_sighup(gpointer /*user_data*/) {
@@ -112,17 +121,26 @@ bool bring_up_ports() {
   }
   store_settings();
   port_registry_setup_all();
+  if (legacy_interface_enabled()) {
+    legacy_write_mappings();
+  }
   return true;
 }
 
 // From here on as the service account.
 void go_public() {
   iocontrol_state_start();
+  if (legacy_interface_enabled()) {
+    iocontrol_conf_legacy_dbus_create();
+  }
   port_registry_arm_watches();
   port_registry_declare_events();
 }
 
 void shut_down(Daemon &daemon) {
+  if (legacy_interface_enabled()) {
+    iocontrol_conf_legacy_dbus_destroy();
+  }
   iocontrol_state_stop();
   daemon.sigterm.reset();
   daemon.sighup.reset();
@@ -131,7 +149,8 @@ void shut_down(Daemon &daemon) {
 
 }  // namespace
 
-int daemon_run(int /*argc*/, char ** /*argv*/) {
+int daemon_run(int argc, char **argv) {
+  read_arguments(argc, argv);
   kv_log_stdout();
   Daemon daemon;
   daemon.loop.reset(g_main_loop_new(nullptr, FALSE));
