@@ -22,15 +22,16 @@ LegacyTest::~LegacyTest() {
 }
 
 IOPort *LegacyTest::add_port(int number, PortType type, const char *flag) {
-  const IOPortRef ioport(io_port_new());
-  io_port_set_id(ioport.get(), "port" + std::to_string(number));
-  io_port_set_number(ioport.get(), number);
-  io_port_set_type(ioport.get(), type);
-  io_port_restore_direction(ioport.get(), io_port_direction_input(ioport.get()));
-  io_port_set_flag(ioport.get(), flag, "true");
-  io_port_set_backend(ioport.get(), 9);
-  port_registry_add(ioport.get());
-  return ioport.get();
+  IOPort *ioport = io_port_new();
+  const IOPortRef ours(ioport);
+  io_port_set_id(ioport, "port" + std::to_string(number));
+  io_port_set_number(ioport, number);
+  io_port_set_type(ioport, type);
+  io_port_restore_direction(ioport, io_port_direction_input(ioport));
+  io_port_set_flag(ioport, flag, "true");
+  io_port_set_backend(ioport, backend_kind_from_word("check").value());
+  port_registry_add(ioport);
+  return ioport;
 }
 
 std::string LegacyTest::write_file(const char *name, const std::string &contents) {

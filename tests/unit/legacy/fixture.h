@@ -11,11 +11,13 @@
 
 // Ports on the check backend, in an otherwise empty registry.
 class LegacyTest : public testing::Test {
+ public:
+  LegacyTest(const LegacyTest &) = delete;
+  LegacyTest &operator=(const LegacyTest &) = delete;
+
  protected:
   LegacyTest();
   ~LegacyTest() override;
-  LegacyTest(const LegacyTest &) = delete;
-  LegacyTest &operator=(const LegacyTest &) = delete;
 
   // The registry keeps the port for as long as the test runs.
   static IOPort *add_port(int number, PortType type, const char *flag = "ioport");

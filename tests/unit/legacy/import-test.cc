@@ -105,7 +105,7 @@ TEST_F(ImportTest, names) {
                                                          {"Gate\"", "Gate\""},
                                                          {"\"Tor \xc3\xa9", "Tor "},
                                                          {"", ""},
-                                                         {"\"a\" \"b\"", "a\" \"b"},
+                                                         {R"("a" "b")", R"(a" "b)"},
                                                          {"Caf\xe9", "Caf\xef\xbf\xbd"}};
   for (const auto &[value, name] : cases) {
     import("[IOPort.I0.Input]\nName=" + std::string(value) + "\n[IOPort.I1.Output]\nName=" + value +

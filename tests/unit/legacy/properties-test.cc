@@ -8,6 +8,8 @@
 
 namespace {
 
+using std::string_view_literals::operator""sv;
+
 class PropertiesTest : public LegacyTest {
  protected:
   // The value in GVariant's text form, or the message of the error.
@@ -46,6 +48,7 @@ class PropertiesTest : public LegacyTest {
   static GVariant *bytes(std::string_view raw) {
     return g_variant_new_fixed_array(G_VARIANT_TYPE_BYTE, raw.data(), raw.size(), 1);
   }
+  static GVariant *text(const char *content) { return g_variant_new_bytestring(content); }
 };
 
 TEST_F(PropertiesTest, counts_need_no_port) {
@@ -85,7 +88,7 @@ TEST_F(PropertiesTest, other_interfaces_name_the_side_in_use) {
   EXPECT_EQ(get(0, kLegacyService, "Name"), "'in'");
   io_port_restore_direction(ioport, false);
   EXPECT_EQ(get(0, kLegacyService, "Name"), "'out'");
-  EXPECT_EQ(set(0, kLegacyService, "Name", bytes({"x", 2})), "Incorrect value for Name");
+  EXPECT_EQ(set(0, kLegacyService, "Name", text("x")), "Incorrect value for Name");
 }
 
 TEST_F(PropertiesTest, texts_are_utf8_whatever_a_port_holds) {
@@ -107,7 +110,7 @@ TEST_F(PropertiesTest, values_that_are_none_have_the_empty_word) {
 }
 
 TEST_F(PropertiesTest, writes_without_a_port) {
-  EXPECT_EQ(set(0, kLegacyInputInterface, "Name", bytes({"x", 2})), "No such port.");
+  EXPECT_EQ(set(0, kLegacyInputInterface, "Name", text("x")), "No such port.");
 }
 
 TEST_F(PropertiesTest, values_of_other_types_change_nothing) {
@@ -129,8 +132,7 @@ TEST_F(PropertiesTest, values_of_other_types_change_nothing) {
 TEST_F(PropertiesTest, bytes_that_are_no_text_change_nothing) {
   IOPort *ioport = add_port(0, PORT_INPUT);
   io_port_restore_name(ioport, "kept", true);
-  for (const std::string_view raw : {std::string_view(), std::string_view("bare"),
-                                     std::string_view("\xff", 2), std::string_view("a\0b", 3)}) {
+  for (const std::string_view raw : {""sv, "bare"sv, "\xff\0"sv, "a\0b"sv}) {
     EXPECT_EQ(set(0, kLegacyInputInterface, "Name", bytes(raw)), "Incorrect value for Name");
   }
   EXPECT_EQ(input_name(ioport), "kept");
@@ -138,7 +140,7 @@ TEST_F(PropertiesTest, bytes_that_are_no_text_change_nothing) {
 
 TEST_F(PropertiesTest, output_sense_of_an_input) {
   add_port(0, PORT_INPUT);
-  EXPECT_EQ(set(0, kLegacyOutputInterface, "Active", bytes({"open", 5})), "Setting Active failed");
+  EXPECT_EQ(set(0, kLegacyOutputInterface, "Active", text("open")), "Setting Active failed");
 }
 
 TEST_F(PropertiesTest, properties_that_cannot_be_written) {
