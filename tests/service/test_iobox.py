@@ -422,6 +422,21 @@ def test_a_sequence_drives_an_output_of_the_box_in_its_order(device, neighbourho
     assert box.modes() == [(OUTPUT, level, "out") for level in (0, 1, 0, 1)]
 
 
+def test_a_sequence_a_storm_and_setting_changes_meet_on_one_port(device, neighbourhood):
+    box = IoBox(neighbourhood, device)
+    device.start()
+    device.call("SetDirection", "us", EITHER, "output")
+    with device.signals("ActionSequenceDone") as done:
+        storm = box.storm(EITHER)
+        for activelow in ("open", "closed") * 5:
+            device.call("StartActionSequence", "uba(bi)", EITHER, False, [(True, 1), (False, 1)] * 50)
+            device.call("SetActive", "ubs", EITHER, False, activelow)
+        storm.result(timeout=60)
+        done.wait_count(10)
+    device.call("SetState", "ub", EITHER, True)
+    assert box.modes()[-1] == (EITHER, 1, "out")
+
+
 def test_a_drop_during_a_sequence_ends_it(device, neighbourhood):
     box = IoBox(neighbourhood, device)
     device.start()

@@ -7,6 +7,7 @@ namespace {
 constexpr std::int64_t kStart = 1'000'000'000;
 constexpr std::int64_t kFullWait = 25'000'000;
 constexpr std::int64_t kRefusal = 1'000;
+constexpr std::int64_t kShortWait = 100'000;
 
 TEST(Patience, WaitsInFullForAServiceThatHasNotFailed) {
   Patience patience;
@@ -51,7 +52,7 @@ TEST(Patience, DoesNotStretchTheMinuteByTheShortWaitsWithinIt) {
   const std::int64_t silent = kStart + kFullWait;
   patience.note_failure(":1.1", kStart, silent);
   const std::int64_t later = silent + Patience::kMemoryUs - 1;
-  patience.note_failure(":1.1", later - Patience::kMomentMs * 1000, later);
+  patience.note_failure(":1.1", later - kShortWait, later);
   EXPECT_EQ(patience.timeout_ms(":1.1", later + 1), Patience::kBusDefault);
 }
 

@@ -5,21 +5,23 @@
 
 namespace {
 
+constexpr int kCheckBackend = 9;
+
 // A backend that asks the registry while it is set up, as an event library may.
+constexpr PortFunctions kCuriousFunctions = {
+    .setup =
+        [](IOPort * /*port*/, bool /*level*/) {
+          (void)port_registry_any_port_active();
+          return true;
+        },
+    .get_state = [](IOPort * /*port*/) { return 0U; },
+};
+
 const PortFunctions *curious_backend(IOPort * /*port*/) {
-  static constexpr PortFunctions kFunctions = {
-      .setup =
-          [](IOPort * /*port*/, bool /*level*/) {
-            (void)port_registry_any_port_active();
-            return true;
-          },
-      .get_state = [](IOPort * /*port*/) { return 0U; },
-  };
-  return &kFunctions;
+  return &kCuriousFunctions;
 }
 
 TEST(RegistryPasses, LeaveTheRegistryFreeWhileABackendIsSetUp) {
-  constexpr int kCheckBackend = 9;
   io_port_register_backend(kCheckBackend, curious_backend);
   IOPortRef port(io_port_new());
   io_port_set_optional(port.get(), true);
