@@ -202,7 +202,7 @@ TEST_F(Documents, KeepAPortWithAnEmptyFilter) {
 }
 
 TEST_F(Documents, AskForTheHardwareOnceEach) {
-  constexpr auto kLevelUser = static_cast<GLogLevelFlags>(256);
+  constexpr int kLevelUser = 256;
   for (int i = 0; i < 2; ++i) {
     ASSERT_TRUE(load("<ports><port hwid='A1' name='a'/><port hwid='B2' name='b'/></ports>"));
     EXPECT_EQ(log.take_all(G_LOG_LEVEL_WARNING, "Could not get the hardware id"), 2U);
