@@ -131,7 +131,7 @@ void set_property(IOPort *port, const char *section, const char *key, const char
   auto *data = io_port_make_backend_data<SysfsBackendData>(port);
   const std::string_view name = key;
   if (std::string_view(section) != "device") {
-    log_warning("Could not parse backend data!");
+    log_warning("Could not parse backend data!\n");
   } else if (name == "path") {
     data->path = value;
   } else if (name == "timeout") {

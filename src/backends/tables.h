@@ -6,6 +6,7 @@
 
 const PortFunctions *check_backend_functions(IOPort *ioport);
 const PortFunctions *gpio_backend_functions(IOPort *ioport);
+const PortFunctions *iobox_backend_functions(IOPort *ioport);
 const PortFunctions *null_backend_functions(IOPort *ioport);
 const PortFunctions *spiadc_backend_functions(IOPort *ioport);
 const PortFunctions *sysfs_backend_functions(IOPort *ioport);

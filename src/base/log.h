@@ -1,7 +1,8 @@
 // The daemon's log. Every message starts with the daemon's log prefix, so that a device which runs
 // several instances can tell them apart; a single instance has an empty one.
 //
-// There is no macro for GLib's error level on purpose: that level always ends the process.
+// There is no macro for GLib's error level on purpose: that level always ends the process, which is
+// what base/fatal.h is for.
 #pragma once
 
 #include <glib.h>

@@ -14,12 +14,18 @@
 #include "base/source.h"
 #include "daemon/paths.h"
 #include "daemon/privileges.h"
+#include "dbus/iocontrol-conf-legacy-dbus.h"
 #include "dbus/iocontrol-state.h"
+#include "dbus/legacy-interface.h"
+#include "dbus/legacy-mappings.h"
 #include "events/event.h"
+#include "events/manual-triggers.h"
+#include "events/trigger-ports.h"
 #include "hwdesc/hwdesc.h"
 #include "platform/kv-log.h"
 #include "port/ioport.h"
 #include "port/port-registry.h"
+#include "settings/param-legacy.h"
 #include "settings/param.h"
 #include "supervised/iosupervised.h"
 #include "supervised/supervised-backends.h"
@@ -31,6 +37,12 @@ struct Daemon {
   Source sigterm;
   Source sighup;
 };
+
+void read_arguments(int argc, char **argv) {
+  if (argc > 1 && std::string_view(argv[1]) == "--disable_legacy_interface") {
+    legacy_interface_disable();
+  }
+}
 
 // Both signals arrive as main-loop sources, so logging and quitting are safe here.
 gboolean on_sighup(gpointer /*user_data*/) {
@@ -84,6 +96,13 @@ bool read_settings() {
   return true;
 }
 
+void import_legacy_export() {
+  if (legacy_export_present()) {
+    Error ignored;  // what could be read counts, and older firmware can't be told of the rest
+    param_import_parhand(kLegacyExport, ignored.out());
+  }
+}
+
 // Once before the settings are stored and, for a file that this start has made, once after: what
 // root leaves behind, the service account must be able to read and replace.
 void store_settings() {
@@ -91,6 +110,7 @@ void store_settings() {
   if (existed) {
     param_chown_to_service_user(kSettingsFile);
   }
+  import_legacy_export();
   port_registry_assign_default_names();
   param_save_all(kSettingsFile);
   if (!existed && access(kSettingsFile, F_OK) == 0) {
@@ -107,7 +127,17 @@ bool bring_up_ports() {
   }
   store_settings();
   port_registry_setup_all();
+  if (legacy_interface_enabled()) {
+    legacy_write_mappings();
+  }
   return true;
+}
+
+void start_manual_triggers() {
+  if (const auto first = hwdesc_first_virtual_input()) {
+    manual_trigger_configure(*first);
+  }
+  manual_trigger_start();
 }
 
 // From here on as the service account.
@@ -115,13 +145,22 @@ void go_public() {
   io_events_start();
   iocontrol_state_start();
   iosupervised_start();
+  if (legacy_interface_enabled()) {
+    iocontrol_conf_legacy_dbus_create();
+  }
   port_registry_arm_watches();
   port_registry_declare_events();
+  start_manual_triggers();
 }
 
 void shut_down(Daemon &daemon) {
+  if (legacy_interface_enabled()) {
+    iocontrol_conf_legacy_dbus_destroy();
+  }
   iosupervised_stop();
   iocontrol_state_stop();
+  manual_trigger_clear();
+  manual_trigger_stop();
   daemon.sigterm.reset();
   daemon.sighup.reset();
   port_registry_drop_all();
@@ -131,7 +170,8 @@ void shut_down(Daemon &daemon) {
 
 }  // namespace
 
-int daemon_run(int /*argc*/, char ** /*argv*/) {
+int daemon_run(int argc, char **argv) {
+  read_arguments(argc, argv);
   kv_log_stdout();
   Daemon daemon;
   daemon.loop.reset(g_main_loop_new(nullptr, FALSE));

@@ -1,5 +1,8 @@
 #include "dbus/connector.h"
 
+#include <functional>
+#include <vector>
+
 #include "base/glib-ptr.h"
 #include "base/own-name.h"
 #include "pcd-connector-gen.h"
@@ -23,29 +26,30 @@ Selection parse_description(const char *description) {
           .audio = all || g_ascii_strcasecmp(description, "audio connector") == 0};
 }
 
-// The states of the selected connectors, in registry order.
-std::vector<gint32> connector_states(const char *description) {
+// Every selected connector, in registry order. A port with both flags is one connector.
+void for_each_connector(const char *description, const std::function<void(IOPort *)> &visit) {
   const Selection selection = parse_description(description);
-  std::vector<gint32> states;
   port_registry_for_each([&](IOPort *ioport) {
     if ((selection.video && io_port_get_flag(ioport, "video_connector")) ||
         (selection.audio && io_port_get_flag(ioport, "audio_connector"))) {
-      states.push_back(io_port_get_state(ioport) ? 1 : 0);
+      visit(ioport);
     }
   });
-  return states;
 }
 
 gboolean get_num_connectors(PCDConnector *object, GDBusMethodInvocation *invocation,
                             const char *description, gpointer /*user_data*/) {
-  pcd_connector_complete_get_num_connectors(
-      object, invocation, static_cast<gint>(connector_states(description).size()));
+  gint count = 0;
+  for_each_connector(description, [&](IOPort * /*ioport*/) { ++count; });
+  pcd_connector_complete_get_num_connectors(object, invocation, count);
   return TRUE;
 }
 
 gboolean get_connector_states(PCDConnector *object, GDBusMethodInvocation *invocation,
                               const char *description, gpointer /*user_data*/) {
-  const auto states = connector_states(description);
+  std::vector<gint32> states;
+  for_each_connector(description,
+                     [&](IOPort *ioport) { states.push_back(io_port_get_state(ioport) ? 1 : 0); });
   pcd_connector_complete_get_connector_states(
       object, invocation,
       g_variant_new_fixed_array(G_VARIANT_TYPE_INT32, states.data(), states.size(),

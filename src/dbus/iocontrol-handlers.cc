@@ -1,13 +1,13 @@
 #include "dbus/iocontrol-handlers.h"
 
 #include <optional>
-#include <string_view>
 
 #include "dbus/reannounce.h"
 #include "port/ioport.h"
 #include "port/port-error.h"
 #include "port/port-registry.h"
 #include "settings/param.h"
+#include "settings/setting-words.h"
 
 namespace {
 
@@ -29,17 +29,6 @@ IOPortRef find_ioport(guint number) {
 
 void save(const IOPortRef &ioport) {
   param_save_for_port(ioport.get(), kSettingsFile);
-}
-
-const char *active_word(bool activelow) {
-  return activelow ? "open" : "closed";
-}
-
-std::optional<bool> parse_word(std::string_view word, std::string_view yes, std::string_view no) {
-  if (word == yes) {
-    return true;
-  }
-  return word == no ? std::optional<bool>(false) : std::nullopt;
 }
 
 gboolean get_state(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
@@ -84,7 +73,7 @@ gboolean get_direction(IOControlState *object, GDBusMethodInvocation *invocation
     return fail_no_port(invocation);
   }
   iocontrol_state_complete_get_direction(object, invocation,
-                                         io_port_input(ioport.get()) ? "input" : "output");
+                                         direction_word(io_port_input(ioport.get())));
   return TRUE;
 }
 
@@ -95,7 +84,7 @@ gboolean set_direction(IOControlState *object, GDBusMethodInvocation *invocation
   if (!ioport) {
     return fail_no_port(invocation);
   }
-  const auto input = parse_word(direction, "input", "output");
+  const auto input = parse_direction(direction);
   if (!input) {
     fail(invocation, IO_CONTROL_ERROR_GENERIC,
          "Incorrect input to set_direction eiter use 'input' or 'output'");
@@ -115,8 +104,8 @@ gboolean get_active(IOControlState *object, GDBusMethodInvocation *invocation, g
     return fail_no_port(invocation);
   }
   iocontrol_state_complete_get_active(object, invocation,
-                                      active_word(io_port_get_activelow(ioport.get(), true)),
-                                      active_word(io_port_get_activelow(ioport.get(), false)));
+                                      activelow_word(io_port_get_activelow(ioport.get(), true)),
+                                      activelow_word(io_port_get_activelow(ioport.get(), false)));
   return TRUE;
 }
 
@@ -127,7 +116,7 @@ gboolean set_active(IOControlState *object, GDBusMethodInvocation *invocation, g
   if (!ioport) {
     return fail_no_port(invocation);
   }
-  const auto activelow = parse_word(state, active_word(true), active_word(false));
+  const auto activelow = parse_activelow(state);
   if (!activelow) {
     fail(invocation, IO_CONTROL_ERROR_GENERIC,
          "Incorrect input to set_active eiter use 'open' or 'closed'");

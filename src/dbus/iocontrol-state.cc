@@ -16,30 +16,35 @@ namespace {
 constexpr const char *kName = "com.kelv.IOControl.State";
 constexpr const char *kPath = "/com/kelv/IOControl/State";
 
-// Action threads emit signals while the main thread may start or stop the interface.
+// Action threads emit signals while the main thread starts or stops the interface, and an object
+// that is being withdrawn must not be emitted on: both happen under the lock.
 std::mutex skeleton_lock;
 GObjectPtr<IOControlState> skeleton;
 GObjectPtr<GDBusConnection> bus;  // once it is there
 BusName control_name;
 BusName connector_name;
 
-GObjectPtr<IOControlState> current_skeleton() {
-  const std::lock_guard lock(skeleton_lock);
-  return GObjectPtr<IOControlState>(
-      skeleton ? static_cast<IOControlState *>(g_object_ref(skeleton.get())) : nullptr);
-}
-
 void emit_port_changed(const PortChange &change) {
-  if (const auto object = current_skeleton()) {
-    iocontrol_state_emit_port_changed(object.get(), change.number, change.is_virtual, change.hidden,
-                                      change.input, change.virtual_trig, change.state,
-                                      change.activelow);
+  const std::lock_guard lock(skeleton_lock);
+  if (skeleton) {
+    iocontrol_state_emit_port_changed(skeleton.get(), change.number, change.is_virtual,
+                                      change.hidden, change.input, change.virtual_trig,
+                                      change.state, change.activelow);
   }
 }
 
 void emit_action_sequence_done(int number) {
-  if (const auto object = current_skeleton()) {
-    iocontrol_state_emit_action_sequence_done(object.get(), number);
+  const std::lock_guard lock(skeleton_lock);
+  if (skeleton) {
+    iocontrol_state_emit_action_sequence_done(skeleton.get(), number);
+  }
+}
+
+void withdraw_object() {
+  const std::lock_guard lock(skeleton_lock);
+  if (skeleton) {
+    g_dbus_interface_skeleton_unexport(G_DBUS_INTERFACE_SKELETON(skeleton.get()));
+    skeleton.reset();
   }
 }
 
@@ -64,14 +69,7 @@ void iocontrol_state_start() {
 }
 
 void iocontrol_state_stop() {
-  GObjectPtr<IOControlState> object;
-  {
-    const std::lock_guard lock(skeleton_lock);
-    object = std::move(skeleton);
-  }
-  if (object) {
-    g_dbus_interface_skeleton_unexport(G_DBUS_INTERFACE_SKELETON(object.get()));
-  }
+  withdraw_object();
   connector_withdraw();
   control_name.reset();
   connector_name.reset();

@@ -2,33 +2,56 @@
 
 #include "base/glib-ptr.h"
 #include "base/log.h"
+#include "base/patience.h"
 
 namespace {
 
 constexpr const char *kService = "com.kelv.PolicyKitSystem";
 constexpr const char *kObject = "/com/kelv/PolicyKitSystem";
-constexpr int kDefaultTimeout = -1;
 
-}  // namespace
+// The hardware description has several documents, and each may ask anew.
+Patience &patience() {
+  static Patience instance;
+  return instance;
+}
 
-std::optional<std::string> read_hardware_id(const char *parameter) {
+// The proxy asks for the properties of the service, so a service that hangs shows here already.
+GObjectPtr<GDBusProxy> make_proxy() {
+  const std::int64_t begun = g_get_monotonic_time();
   Error error;
-  const GObjectPtr<GDBusProxy> proxy(
+  GObjectPtr<GDBusProxy> proxy(
       g_dbus_proxy_new_for_bus_sync(G_BUS_TYPE_SYSTEM, G_DBUS_PROXY_FLAGS_NONE, nullptr, kService,
                                     kObject, kService, nullptr, error.out()));
   if (!proxy) {
     log_user("Failed to setup proxy: %s", error.message());
-    return std::nullopt;
+    return proxy;
   }
-  const GVariantPtr reply(
-      g_dbus_proxy_call_sync(proxy.get(), "ReadBootblockParam", g_variant_new("(s)", parameter),
-                             G_DBUS_CALL_FLAGS_NONE, kDefaultTimeout, nullptr, error.out()));
+  patience().note_failure(proxy_owner(proxy.get()), begun, g_get_monotonic_time());
+  return proxy;
+}
+
+GVariantPtr ask(GDBusProxy *proxy, const char *parameter) {
+  Error error;
+  GVariantPtr reply = call_with_patience(patience(), proxy, "ReadBootblockParam",
+                                         g_variant_new("(s)", parameter), error.out());
   if (!reply) {
     log_info("Failed to request policykit system: %s", error.message());
-    return std::nullopt;
-  }
-  if (!g_variant_is_of_type(reply.get(), G_VARIANT_TYPE("(s)"))) {
+  } else if (!g_variant_is_of_type(reply.get(), G_VARIANT_TYPE("(s)"))) {
     log_info("Failed to request policykit system: %s", "the answer is not a single string");
+    reply.reset();
+  }
+  return reply;
+}
+
+}  // namespace
+
+std::optional<std::string> read_hardware_id(const char *parameter) {
+  static GObjectPtr<GDBusProxy> proxy;
+  if (!proxy) {
+    proxy = make_proxy();
+  }
+  const GVariantPtr reply = proxy ? ask(proxy.get(), parameter) : nullptr;
+  if (!reply) {
     return std::nullopt;
   }
   const char *value = nullptr;

@@ -71,6 +71,11 @@ struct IOPort {
 // the port until the lock is given up.
 [[nodiscard]] std::unique_lock<std::mutex> io_port_stop_sequence_and_lock(IOPort *ioport);
 
+// Whether the backend can be asked: not while it has given up its record.
+inline bool io_port_backend_serves(const IOPort *ioport) {
+  return ioport->functions && !ioport->backend_released;
+}
+
 // Frees the port, whoever may still hold references.
 void io_port_destroy(IOPort *ioport);
 

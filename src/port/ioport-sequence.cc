@@ -147,8 +147,9 @@ bool io_port_is_busy(IOPort *ioport) {
 
 std::unique_lock<std::mutex> io_port_stop_sequence_and_lock(IOPort *ioport) {
   std::unique_lock sequence(ioport->sequence_lock);
-  ioport->cancel_sequence = true;
   while (ioport->sequence_running) {
+    // Asked for anew at each wake-up: another sequence may have begun since the last one ended.
+    ioport->cancel_sequence = true;
     ioport->sequence_cond.notify_all();
     ioport->sequence_done_cond.wait(sequence);
   }

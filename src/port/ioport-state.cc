@@ -80,7 +80,8 @@ bool io_port_set_virtual(IOPort *ioport, bool state) {
   if (!ioport->events_enabled) {
     return true;
   }
-  if (ioport->backend == kVirtualBackend && ioport->type == PORT_OUTPUT) {
+  if (ioport->backend == kVirtualBackend && ioport->type == PORT_OUTPUT &&
+      io_port_backend_serves(ioport)) {
     ioport->functions->set_state(ioport, state);
   }
   io_port_fire_events(ioport, state);
@@ -114,7 +115,8 @@ void io_port_send_signal(IOPort *port, bool virtual_change, bool state) {
 
 void io_port_set_watch(IOPort *port) {
   g_assert(port != NULL);
-  if (port->events_enabled && io_port_input(port) && port->functions->start_watch) {
+  if (port->events_enabled && io_port_input(port) && port->functions->start_watch &&
+      io_port_backend_serves(port)) {
     port->functions->start_watch(port);
   }
 }

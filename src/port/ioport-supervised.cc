@@ -24,7 +24,8 @@ bool valid_limits(std::uint32_t lower, std::uint32_t upper) {
 bool io_port_is_supervisable(IOPort *port) {
   assert_nonnull(port);
   assert_nonnull(port->functions);
-  return port->functions->is_supervisable && port->functions->is_supervisable(port);
+  return port->functions->is_supervisable && io_port_backend_serves(port) &&
+         port->functions->is_supervisable(port);
 }
 
 bool io_port_set_supervised(IOPort *port, bool supervised) {

@@ -34,7 +34,7 @@ void install_backend(IOPort *ioport) {
 }
 
 void release_backend(IOPort *ioport) {
-  if (ioport->functions && ioport->functions->free && !ioport->backend_released) {
+  if (io_port_backend_serves(ioport) && ioport->functions->free) {
     ioport->functions->free(ioport);
     ioport->backend_released = true;
   }
@@ -141,7 +141,9 @@ void io_port_set_backend_property(IOPort *ioport, const char *section, const cha
     return;
   }
   ioport->backend_properties.push_back({section, key, value});
-  apply_backend_property(ioport, ioport->backend_properties.back());
+  if (io_port_backend_serves(ioport)) {
+    apply_backend_property(ioport, ioport->backend_properties.back());
+  }
 }
 
 PortBackendData *io_port_backend_data(const IOPort *ioport) {

@@ -1,6 +1,8 @@
 #include "port/port-registry.h"
 
 #include <algorithm>
+#include <iterator>
+#include <unordered_set>
 #include <utility>
 
 #include "base/log.h"
@@ -77,16 +79,31 @@ std::size_t move_ports(Ports &from, Ports &to, Predicate moves) {
   return moved;
 }
 
-// References to the ports in service, for passes that must not hold the lock.
-std::vector<IOPortRef> snapshot() {
+// References to the ports of a list, for passes that must not hold the lock.
+std::vector<IOPortRef> snapshot(const Ports &list) {
   const std::lock_guard lock(registry().lock);
   std::vector<IOPortRef> ports;
-  for (IOPort *ioport : registry().active) {
-    if (io_port_has_backend(ioport)) {
-      ports.push_back(new_reference(ioport));
+  std::transform(list.begin(), list.end(), std::back_inserter(ports), new_reference);
+  return ports;
+}
+
+// The ports in service that can be called.
+std::vector<IOPortRef> snapshot_with_backend() {
+  auto ports = snapshot(registry().active);
+  std::erase_if(ports, [](const IOPortRef &ioport) { return !io_port_has_backend(ioport.get()); });
+  return ports;
+}
+
+// Sets up the ports of a list, without the lock: a backend may wait for its service, and it may
+// declare events, whose library may ask the registry. Gives the ports for which set-up ended so.
+std::unordered_set<const IOPort *> set_up_all(const Ports &list, bool outcome) {
+  std::unordered_set<const IOPort *> chosen;
+  for (const auto &ioport : snapshot(list)) {
+    if (set_up(ioport.get()) == outcome) {
+      chosen.insert(ioport.get());
     }
   }
-  return ports;
+  return chosen;
 }
 
 std::string default_input_name(const IOPort *ioport, int inputs_seen) {
@@ -208,14 +225,17 @@ void port_registry_assign_default_names() {
 }
 
 void port_registry_setup_all() {
+  const auto failed = set_up_all(registry().active, false);
   const std::lock_guard lock(registry().lock);
   move_ports(registry().active, registry().parked,
-             [](IOPort *ioport) { return !set_up(ioport) && ioport->optional; });
+             [&](const IOPort *ioport) { return ioport->optional && failed.count(ioport) > 0; });
 }
 
 std::size_t port_registry_retry_parked() {
+  const auto ready = set_up_all(registry().parked, true);
   const std::lock_guard lock(registry().lock);
-  return move_ports(registry().parked, registry().active, set_up);
+  return move_ports(registry().parked, registry().active,
+                    [&](const IOPort *ioport) { return ready.count(ioport) > 0; });
 }
 
 void port_registry_park(IOPort *ioport) {
@@ -226,13 +246,13 @@ void port_registry_park(IOPort *ioport) {
 }
 
 void port_registry_arm_watches() {
-  for (const auto &ioport : snapshot()) {
+  for (const auto &ioport : snapshot_with_backend()) {
     io_port_set_watch(ioport.get());
   }
 }
 
 void port_registry_declare_events() {
-  for (const auto &ioport : snapshot()) {
+  for (const auto &ioport : snapshot_with_backend()) {
     if (io_port_events_enabled(ioport.get())) {
       io_port_declare_events(ioport.get());
     }

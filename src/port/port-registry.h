@@ -43,7 +43,8 @@ bool port_registry_any_port_active();
 void port_registry_for_each(const std::function<void(IOPort *)> &visit);
 // Names the ports that have none yet: "Input 1", "Output 1" and so on, by rising port number.
 void port_registry_assign_default_names();
-// Sets up every port. An optional port that fails is parked.
+// Sets up every port. An optional port that fails is parked. Neither pass holds the lock while it
+// calls a backend.
 void port_registry_setup_all();
 // Tries the parked ports again and gives the number that came back.
 std::size_t port_registry_retry_parked();

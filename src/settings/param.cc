@@ -5,12 +5,10 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <array>
 #include <cerrno>
 #include <cstdio>
 #include <mutex>
 #include <optional>
-#include <string_view>
 #include <utility>
 #include <vector>
 
@@ -19,13 +17,11 @@
 #include "platform/confutils.h"
 #include "port/ioport.h"
 #include "port/port-registry.h"
+#include "settings/setting-words.h"
 
 namespace {
 
 constexpr const char *kServiceAccount = "pcd";
-
-constexpr std::array<const char *, 3> kButtonWords = {"none", "pulse", "actinact"};
-constexpr std::array<const char *, 3> kModeWords = {"", "monostable", "bistable"};
 
 std::mutex settings_lock;
 GKeyFilePtr key_file;  // guarded by settings_lock; none between two operations in normal service
@@ -120,12 +116,11 @@ bool GroupReader::read_button() {
   if (!word) {
     return false;
   }
-  const auto *const found =
-      std::find(kButtonWords.begin(), kButtonWords.end(), std::string_view(word.get()));
-  if (found == kButtonWords.end()) {
+  const auto button = parse_button(word.get());
+  if (!button) {
     return false;
   }
-  io_port_set_button(ioport_, static_cast<int>(found - kButtonWords.begin()));
+  io_port_set_button(ioport_, *button);
   return true;
 }
 
@@ -139,9 +134,7 @@ bool GroupReader::read_times_and_mode() {
   if (!mode) {
     return false;
   }
-  io_port_set_mode(ioport_, std::string_view(mode.get()) == kModeWords[PORT_MODE_BISTABLE]
-                                ? PORT_MODE_BISTABLE
-                                : PORT_MODE_MONOSTABLE);
+  io_port_set_mode(ioport_, parse_mode(mode.get()).value_or(PORT_MODE_MONOSTABLE));
   if (!get_uint64("delay_time", &time)) {
     return false;
   }
@@ -196,12 +189,12 @@ void write_side(IOPort *ioport, const char *group, bool input) {
 }
 
 void write_output_behaviour(IOPort *ioport, const char *group) {
-  const auto button = static_cast<std::size_t>(io_port_get_button(ioport));
-  if (button < kButtonWords.size()) {
-    set_string(group, "button_type", kButtonWords.at(button));
+  const std::string button = button_word(io_port_get_button(ioport));
+  if (!button.empty()) {
+    set_string(group, "button_type", button);
   }
   g_key_file_set_uint64(key_file.get(), group, "pulse_time", io_port_get_pulse_time(ioport));
-  set_string(group, "port_mode", kModeWords.at(static_cast<std::size_t>(io_port_get_mode(ioport))));
+  set_string(group, "port_mode", mode_word(io_port_get_mode(ioport)));
   // A negative time becomes a very large number: the file has always been read back that way.
   g_key_file_set_uint64(key_file.get(), group, "delay_time",
                         static_cast<std::uint64_t>(std::int64_t{io_port_get_delay_time(ioport)}));

@@ -19,7 +19,7 @@ constexpr Level kLevels[] = {
     {G_LOG_LEVEL_INFO, "INFO"},       {G_LOG_LEVEL_DEBUG, "DEBUG"},
 };
 
-std::string level_word(GLogLevelFlags level) {
+std::string level_word(int level) {
   for (const auto &entry : kLevels) {
     if (level & entry.flag) {
       return entry.word;
@@ -54,11 +54,17 @@ void append_as_one_line(std::string &line, std::string_view text) {
   }
 }
 
-GLogWriterOutput write_to_stdout(GLogLevelFlags level, const GLogField *fields, gsize count,
-                                 gpointer /*user_data*/) {
+// Applications have levels above GLib's own, which the type that GLib passes them in can't hold by
+// the rules of C++. They are read once here, and are plain numbers from then on.
+__attribute__((no_sanitize("enum"))) GLogWriterOutput write_to_stdout(GLogLevelFlags flags,
+                                                                      const GLogField *fields,
+                                                                      gsize count,
+                                                                      gpointer /*user_data*/) {
+  const int level = flags;
   const std::string domain(field(fields, count, "GLIB_DOMAIN"));
   if ((level & G_LOG_LEVEL_DEBUG) &&
-      g_log_writer_default_would_drop(level, domain.empty() ? nullptr : domain.c_str())) {
+      g_log_writer_default_would_drop(G_LOG_LEVEL_DEBUG,
+                                      domain.empty() ? nullptr : domain.c_str())) {
     return G_LOG_WRITER_HANDLED;
   }
   std::string line = level_word(level) + ": ";

@@ -28,7 +28,7 @@ namespace {
 
 // The kernel has the files of an exported line ready at once. The rights that a rule of the device
 // manager gives to them come a moment later.
-constexpr gint64 kSettleTime = 300 * G_TIME_SPAN_MILLISECOND;
+constexpr gint64 kSettleTime = 500 * G_TIME_SPAN_MILLISECOND;
 constexpr gulong kSettlePoll = G_TIME_SPAN_MILLISECOND;
 
 constexpr std::size_t kAttributeSize = 64;

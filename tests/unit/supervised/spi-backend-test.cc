@@ -173,7 +173,7 @@ TEST_F(Spi, ADroppedPortKeepsOneDescriptorAndComesBackAgainAndAgain) {
     ASSERT_EQ(timers().size(), 0U);
     ASSERT_EQ(open_devices(), 1U);
   }
-  EXPECT_EQ(ranges_of(port), (SupervisedRanges{{SUPERVISED_STATE_OPEN, 30, 20}}));
+  EXPECT_EQ(io_port_range_list(port.get()), (SupervisedRanges{{SUPERVISED_STATE_OPEN, 30, 20}}));
 }
 
 TEST_F(Spi, TheControlPinsOfAnOutputAreAProgrammingError) {

@@ -11,7 +11,7 @@
 #include <vector>
 
 struct LogMessage {
-  GLogLevelFlags level;
+  int level;  // a number, since applications have levels that GLogLevelFlags does not hold
   std::string text;
 };
 
@@ -24,18 +24,18 @@ class LogCapture {
   LogCapture &operator=(const LogCapture &) = delete;
 
   // Takes the oldest message of that level and text. False: there is none.
-  [[nodiscard]] bool took(GLogLevelFlags level, std::string_view text);
+  [[nodiscard]] bool took(int level, std::string_view text);
   [[nodiscard]] bool took_warning(std::string_view text);
   [[nodiscard]] bool took_critical(std::string_view text);
-  // The same for a text that only begins like that, where the system words the rest.
-  [[nodiscard]] bool took_beginning(GLogLevelFlags level, std::string_view beginning);
+  // The same for a part of the text, where the system words the rest.
+  [[nodiscard]] bool took_containing(int level, std::string_view part);
   // Takes every message of that level and text and gives their number.
-  [[nodiscard]] std::size_t take_all(GLogLevelFlags level, std::string_view text);
+  [[nodiscard]] std::size_t take_all(int level, std::string_view text);
   // Takes everything, for tests that are not about what is logged.
   void forget();
 
  private:
-  static void handle(const gchar *domain, GLogLevelFlags level, const gchar *text, gpointer self);
+  static void handle(const gchar *domain, GLogLevelFlags flags, const gchar *text, gpointer self);
   template <typename Matches>
   bool take_first(Matches matches);
 

@@ -9,11 +9,15 @@
 #include "support/log-capture.h"
 #include "support/port-builder.h"
 #include "support/recording-listener.h"
+#include "supervised/supervised-backends.h"
 
 // Frees the ports of the registry at its end: references that a test holds must be gone by then.
 class PortFixture : public testing::Test {
  protected:
-  PortFixture() { backends_register(); }
+  PortFixture() {
+    backends_register();
+    supervised_backends_register();
+  }
   ~PortFixture() override { port_registry_drop_all(); }
 
   LogCapture log;

@@ -1,4 +1,4 @@
-#include "platform/configevent.h"
+#include "platform/configuration-event.h"
 
 #include <algorithm>
 #include <memory>

@@ -1,0 +1,16 @@
+// Settings that older firmware left behind: the export of its parameter store, called the parhand
+// file, and settings files to be merged. Main thread.
+#pragma once
+
+#include <glib.h>
+
+// Carries the parameters of a parhand file over into the ports in service, group by group in the
+// order of the file. Nothing is stored. What can't be read costs the rest of its group, and the
+// first such case is reported in `error` (domain of the control interface); an input group of a
+// port that does not exist ends the import.
+void param_import_parhand(const char *file, GError **error);
+
+// Copies every key of the settings file `input` into the settings file `output`, in place of those
+// that are there. False and `error` when either can't be read; false, with a message in the log,
+// when the result can't be stored, which leaves `output` as it was.
+bool param_upgrade(const char *input, const char *output, GError **error);

@@ -1,0 +1,61 @@
+"""The demo: shows its device's ports and their changes, and ends cleanly however it is ended."""
+
+import re
+import signal
+import subprocess
+import sys
+from pathlib import Path
+
+import pytest
+
+from harness import default_binary, scale
+from harness.device import REPOSITORY
+
+
+@pytest.fixture
+def demo(tmp_path: Path):
+    """Starts the demo with a folder for temporary files of its own."""
+    processes: list[subprocess.Popen] = []
+
+    def start(*arguments: str) -> subprocess.Popen:
+        command = [sys.executable, "demo/demo.py", "--binary", str(default_binary()), *arguments]
+        process = subprocess.Popen(
+            command,
+            cwd=REPOSITORY,
+            env={"PATH": "/usr/sbin:/usr/bin:/sbin:/bin", "TMPDIR": str(tmp_path)},
+            stdout=subprocess.PIPE,
+            stderr=subprocess.PIPE,
+            text=True,
+        )
+        processes.append(process)
+        return process
+
+    yield start
+    for process in processes:
+        process.kill()
+        process.communicate()
+    assert list(tmp_path.iterdir()) == []
+
+
+def test_shows_the_table_and_then_the_changes(demo):
+    process = demo("--seconds", "5")
+    output, errors = process.communicate(timeout=60 * scale())
+    assert (process.returncode, errors) == (0, "")
+    table, _, changes = output.partition("\n\n")[2].partition("\n\n")
+    # The optional port's module is plugged in later.
+    assert [line.split()[1] for line in table.splitlines()[1:]] == [
+        "door", "pir_detector", "forwarding", "relay", "io1", "alarm", "spare",
+    ]  # fmt: skip
+    assert re.search(r"^ +\d+\.\ds  port 0 Door contact +input +active$", changes, re.MULTILINE)
+    assert re.search(r"^ +\d+\.\ds  port 3 Relay +output +active$", changes, re.MULTILINE)
+
+
+@pytest.mark.parametrize("number", [signal.SIGINT, signal.SIGTERM])
+def test_an_interrupt_is_a_regular_end(demo, number):
+    process = demo()
+    assert process.stdout is not None
+    while "Door contact" not in process.stdout.readline():
+        assert process.poll() is None
+    process.send_signal(number)
+    _, errors = process.communicate(timeout=60 * scale())
+    assert (process.returncode, errors) == (0, "")

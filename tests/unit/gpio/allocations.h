@@ -1,0 +1,6 @@
+// Counts what the test program allocates through operator new.
+#pragma once
+
+#include <atomic>
+
+inline std::atomic<int> allocations = 0;

@@ -1,0 +1,514 @@
+#include <cerrno>
+#include <thread>
+
+#include "backends/tables.h"
+#include "fake-ugpio.h"
+#include "port-fixture.h"
+#include "seams.h"
+
+namespace {
+
+using Calls = std::vector<std::string>;
+using States = std::vector<bool>;
+
+constexpr const char *kCouldNotSet = "Failed to set state on port!\n";
+constexpr const char *kCouldNotTurn = "Couldn't change direction on port!\n";
+
+class GpioBackendTest : public PortTest {
+ protected:
+  GpioBackendTest() {
+    fake_ugpio().reset();
+    seams() = {};
+  }
+
+  IOPort *make(PortType type, const std::vector<Property> &properties) {
+    return make_port("gpio", type, properties);
+  }
+  IOPort *make_input() { return make(PORT_INPUT, {{"input", "pin", "1"}}); }
+  IOPort *make_output() { return make(PORT_OUTPUT, {{"output", "pin", "2"}}); }
+  IOPort *make_configurable() {
+    return make(PORT_CONFIGURABLE,
+                {{"input", "pin", "1"}, {"output", "pin", "2"}, {"io_ctrl", "pin", "3"}});
+  }
+  // Set up and with its watch armed.
+  IOPort *make_watched_input() {
+    IOPort *input = make_input();
+    EXPECT_TRUE(io_port_setup(input));
+    io_port_set_watch(input);
+    return input;
+  }
+  static FakeLine &line(const char *name) { return fake_ugpio().line(name); }
+  static States take_reported() { return std::exchange(reported, {}); }
+};
+
+// --- The hardware description ---
+
+TEST_F(GpioBackendTest, AnUnknownSectionIsLoggedAndChangesNothing) {
+  make(PORT_CONFIGURABLE, {{"io-ctrl", "pin", "3"}, {"Input", "pin", "1"}});
+  EXPECT_EQ(log.count("Could not parse backend data!\n"), 2);
+  EXPECT_TRUE(io_port_setup(port()));
+  EXPECT_TRUE(fake_ugpio().calls.empty());
+}
+
+TEST_F(GpioBackendTest, APinWithNumberAndAliasIsRequestedByTheAlias) {
+  make(PORT_INPUT, {{"input", "pin", "12"}, {"input", "alias", "alarm"}});
+  EXPECT_TRUE(io_port_setup(port()));
+  EXPECT_EQ(fake_ugpio().calls, (Calls{"request_one_named alarm 0x14D", "activelow alarm 0"}));
+}
+
+// --- Set-up ---
+
+TEST_F(GpioBackendTest, AnInputIsRequestedWithBothEdges) {
+  EXPECT_TRUE(io_port_setup(make_input()));
+  EXPECT_EQ(fake_ugpio().calls, (Calls{"request_one pin 1 0x14D", "activelow 1 0"}));
+}
+
+TEST_F(GpioBackendTest, AnOutputStartsInactive) {
+  EXPECT_TRUE(io_port_setup(make_output()));
+  EXPECT_EQ(fake_ugpio().calls, (Calls{"request_one pin 2 0x40", "activelow 2 0"}));
+}
+
+TEST_F(GpioBackendTest, AnActiveLowOutputStartsHigh) {
+  io_port_restore_activelow(make_output(), true, false);
+  EXPECT_TRUE(io_port_setup(port()));
+  EXPECT_EQ(fake_ugpio().calls.front(), "request_one pin 2 0x42");
+}
+
+TEST_F(GpioBackendTest, AnOutputOnAnInvertedPinStartsAtTheOtherLevel) {
+  make(PORT_OUTPUT, {{"output", "pin", "2"}, {"output", "inverted", "true"}});
+  EXPECT_TRUE(io_port_setup(port()));
+  EXPECT_EQ(fake_ugpio().calls, (Calls{"request_one pin 2 0x42", "activelow 2 1"}));
+}
+
+TEST_F(GpioBackendTest, AnActiveLowOutputOnAnInvertedPinStartsLow) {
+  make(PORT_OUTPUT, {{"output", "pin", "2"}, {"output", "inverted", "true"}});
+  io_port_restore_activelow(port(), true, false);
+  EXPECT_TRUE(io_port_setup(port()));
+  EXPECT_EQ(fake_ugpio().calls.front(), "request_one pin 2 0x40");
+}
+
+TEST_F(GpioBackendTest, AConfigurableInputHasItsOutputAndItsDriverOff) {
+  io_port_restore_activelow(make_configurable(), true, false);
+  EXPECT_TRUE(io_port_setup(port()));
+  EXPECT_EQ(fake_ugpio().calls,
+            (Calls{"request_one pin 1 0x14D", "activelow 1 0", "request_one pin 2 0x40",
+                   "activelow 2 0", "request_one pin 3 0x40", "activelow 3 0"}));
+}
+
+TEST_F(GpioBackendTest, AConfigurableOutputStartsInactiveWithItsDriverOn) {
+  io_port_restore_activelow(make_configurable(), true, false);
+  io_port_restore_direction(port(), false);
+  EXPECT_TRUE(io_port_setup(port()));
+  EXPECT_EQ(fake_ugpio().calls,
+            (Calls{"request_one pin 1 0x14D", "activelow 1 0", "request_one pin 2 0x42",
+                   "activelow 2 0", "request_one pin 3 0x42", "activelow 3 0"}));
+}
+
+TEST_F(GpioBackendTest, SetUpSucceedsWhenNoLineCanBeHad) {
+  for (const char *name : {"1", "2", "3"}) {
+    line(name).request_error = EBUSY;
+  }
+  EXPECT_TRUE(io_port_setup(make_configurable()));
+  EXPECT_EQ(log.warnings(),
+            (Calls{"Failed to allocate pin 1/(null)", "Failed to allocate pin 2/(null)",
+                   "Failed to allocate pin 3/(null)"}));
+}
+
+TEST_F(GpioBackendTest, SetUpSucceedsWhenTheDocumentForgetsThePins) {
+  EXPECT_TRUE(io_port_setup(make(PORT_CONFIGURABLE, {})));
+  EXPECT_EQ(log.warnings(),
+            (Calls{"Port terminal has no input line", "Port terminal has no output line",
+                   "Port terminal has no io_ctrl line"}));
+}
+
+// --- Levels ---
+
+TEST_F(GpioBackendTest, AnInputReadsItsLine) {
+  EXPECT_TRUE(io_port_setup(make_input()));
+  EXPECT_FALSE(io_port_get_state(port()));
+  line("1").value = 1;
+  EXPECT_TRUE(io_port_get_state(port()));
+}
+
+TEST_F(GpioBackendTest, AnyLevelButZeroIsOne) {
+  EXPECT_TRUE(io_port_setup(make_input()));
+  line("1").value = 4;
+  EXPECT_TRUE(io_port_get_state(port()));
+}
+
+TEST_F(GpioBackendTest, AFailedReadYieldsOne) {
+  EXPECT_TRUE(io_port_setup(make_input()));
+  line("1").read_error = EIO;
+  EXPECT_TRUE(io_port_get_state(port()));
+}
+
+TEST_F(GpioBackendTest, AnOutputIsDrivenAndReadBack) {
+  EXPECT_TRUE(io_port_setup(make_output()));
+  EXPECT_TRUE(io_port_set_state(port(), true));
+  EXPECT_EQ(line("2").value, 1);
+  EXPECT_TRUE(io_port_get_state(port()));
+  EXPECT_EQ(reported, States{true});
+}
+
+TEST_F(GpioBackendTest, AnOutputThatCannotBeDrivenIsLogged) {
+  EXPECT_TRUE(io_port_setup(make_output()));
+  line("2").write_error = EIO;
+  EXPECT_TRUE(io_port_set_state(port(), true));
+  EXPECT_EQ(log.count(kCouldNotSet), 1);
+  EXPECT_TRUE(reported.empty());
+}
+
+// --- Ports without a line ---
+
+TEST_F(GpioBackendTest, APortWhoseLineIsRefusedLivesOn) {
+  line("1").request_error = EBUSY;
+  line("2").request_error = EACCES;
+  line("3").request_error = EBUSY;
+  EXPECT_TRUE(io_port_setup(make_configurable()));
+  io_port_set_watch(port());
+  EXPECT_TRUE(io_port_get_state(port()));
+  EXPECT_TRUE(io_port_set_direction(port(), false));
+  EXPECT_TRUE(io_port_get_state(port()));
+  EXPECT_TRUE(io_port_set_state(port(), true));
+  EXPECT_TRUE(io_port_set_activelow(port(), true, false));
+  EXPECT_TRUE(io_port_set_direction(port(), true));
+  EXPECT_TRUE(io_port_set_activelow(port(), true, true));
+  io_port_set_watch(port());
+  EXPECT_EQ(log.count(kCouldNotTurn), 2);
+  EXPECT_EQ(seams().fd_watches.size(), 0U);
+  EXPECT_EQ(serve(), 0);
+}
+
+TEST_F(GpioBackendTest, APortWhoseDocumentForgetsThePinsLivesOn) {
+  EXPECT_TRUE(io_port_setup(make(PORT_CONFIGURABLE, {})));
+  io_port_set_watch(port());
+  EXPECT_TRUE(io_port_get_state(port()));
+  EXPECT_TRUE(io_port_set_direction(port(), false));
+  EXPECT_TRUE(io_port_set_state(port(), true));
+  EXPECT_TRUE(io_port_set_direction(port(), true));
+  EXPECT_GE(log.count(kCouldNotSet), 3);
+  EXPECT_EQ(log.count(kCouldNotTurn), 2);
+  EXPECT_EQ(seams().fd_watches.size(), 0U);
+}
+
+TEST_F(GpioBackendTest, ALineThatDoesNotOpenReadsOneAndIsNotWatched) {
+  line("1").open_error = EACCES;
+  EXPECT_TRUE(io_port_setup(make_input()));
+  io_port_set_watch(port());
+  EXPECT_TRUE(io_port_get_state(port()));
+  EXPECT_EQ(seams().fd_watches.size(), 0U);
+}
+
+// --- Direction ---
+
+TEST_F(GpioBackendTest, BecomingAnInputTurnsTheOutputOffBeforeTheDriver) {
+  io_port_restore_direction(make_configurable(), false);
+  io_port_restore_activelow(port(), true, false);
+  EXPECT_TRUE(io_port_setup(port()));
+  fake_ugpio().take_calls();
+  EXPECT_TRUE(io_port_set_direction(port(), true));
+  EXPECT_EQ(fake_ugpio().calls, (Calls{"set 2 0", "set 3 0"}));
+}
+
+TEST_F(GpioBackendTest, BecomingAnOutputTurnsTheDriverOnBeforeTheInactiveLevel) {
+  EXPECT_TRUE(io_port_setup(make_configurable()));
+  fake_ugpio().take_calls();
+  EXPECT_TRUE(io_port_set_direction(port(), false));
+  EXPECT_EQ(fake_ugpio().calls, (Calls{"set 3 1", "set 2 0"}));
+}
+
+TEST_F(GpioBackendTest, AnActiveLowPortBecomesAnOutputAtHighLevel) {
+  io_port_restore_activelow(make_configurable(), true, false);
+  EXPECT_TRUE(io_port_setup(port()));
+  fake_ugpio().take_calls();
+  EXPECT_TRUE(io_port_set_direction(port(), false));
+  EXPECT_EQ(fake_ugpio().calls, (Calls{"set 3 1", "set 2 1"}));
+  EXPECT_FALSE(io_port_get_state(port()));
+}
+
+TEST_F(GpioBackendTest, ADriverThatCannotBeSwitchedIsLogged) {
+  EXPECT_TRUE(io_port_setup(make_configurable()));
+  line("3").write_error = EIO;
+  EXPECT_TRUE(io_port_set_direction(port(), false));
+  EXPECT_TRUE(io_port_set_direction(port(), true));
+  EXPECT_EQ(log.count(kCouldNotTurn), 2);
+}
+
+TEST_F(GpioBackendTest, ReadsFollowTheDirection) {
+  EXPECT_TRUE(io_port_setup(make_configurable()));
+  line("1").value = 1;
+  EXPECT_TRUE(io_port_get_state(port()));
+  EXPECT_TRUE(io_port_set_direction(port(), false));
+  EXPECT_FALSE(io_port_get_state(port()));
+}
+
+TEST_F(GpioBackendTest, ADirectionIsReportedOnceWithTheStateOfTheNewRole) {
+  EXPECT_TRUE(io_port_setup(make_configurable()));
+  io_port_set_watch(port());
+  line("1").value = 1;
+  EXPECT_TRUE(io_port_set_direction(port(), false));
+  EXPECT_EQ(take_reported(), States{false});
+  EXPECT_TRUE(io_port_set_direction(port(), true));
+  EXPECT_EQ(serve(), 0);
+  EXPECT_EQ(take_reported(), States{true});
+}
+
+// --- Watch and edges ---
+
+TEST_F(GpioBackendTest, TheWatchIsForErrorsAlone) {
+  make_watched_input();
+  EXPECT_EQ(seams().fd_conditions, std::vector<GIOCondition>{G_IO_ERR});
+}
+
+TEST_F(GpioBackendTest, AnEdgeIsReportedAfterTheLineHadTimeToSettle) {
+  make_watched_input();
+  line("1").edge(1);
+  EXPECT_EQ(serve(), 1);
+  EXPECT_EQ(reported, States{true});
+  EXPECT_EQ(seams().sleeps, std::vector<gulong>{500});
+}
+
+TEST_F(GpioBackendTest, EveryEdgeIsReported) {
+  make_watched_input();
+  for (const bool level : {true, false, true}) {
+    line("1").edge(level ? 1 : 0);
+    serve();
+  }
+  EXPECT_EQ(reported, (States{true, false, true}));
+}
+
+TEST_F(GpioBackendTest, AnEdgeOfAnActiveLowInputIsReportedInverted) {
+  io_port_restore_activelow(make_watched_input(), true, true);
+  line("1").edge(1);
+  serve();
+  EXPECT_EQ(reported, States{false});
+}
+
+TEST_F(GpioBackendTest, WithoutAnEdgeNothingIsReported) {
+  make_watched_input();
+  EXPECT_EQ(serve(), 0);
+  EXPECT_TRUE(reported.empty());
+}
+
+TEST_F(GpioBackendTest, ALineThatMovesAfterItsReportIsReportedAgain) {
+  make_watched_input();
+  line("1").script = {1, 0, 0, 1, 1};
+  line("1").edge(1);
+  serve();
+  EXPECT_EQ(reported, (States{true, false, true}));
+}
+
+TEST_F(GpioBackendTest, AfterABurstTheReportedStateIsTheStateOfTheLine) {
+  make_watched_input();
+  for (int i = 0; i < 41; ++i) {
+    line("1").script.push_back(i % 2);
+  }
+  line("1").edge(1);
+  serve();
+  EXPECT_EQ(reported.back(), io_port_get_state(port()));
+  EXPECT_TRUE(reported.back());
+}
+
+TEST_F(GpioBackendTest, ALineThatNeverRestsLeavesTurnsToOthers) {
+  make_watched_input();
+  for (int i = 0; i < 2000; ++i) {
+    line("1").script.push_back(i % 2);
+  }
+  line("1").edge(0);
+  EXPECT_TRUE(g_main_context_iteration(nullptr, FALSE));
+  EXPECT_FALSE(line("1").script.empty()) << "one turn served the whole burst";
+  EXPECT_LT(serve(1000), 1000);
+  EXPECT_TRUE(line("1").script.empty()) << "the port lost sight of the line";
+  EXPECT_FALSE(reported.back());
+}
+
+TEST_F(GpioBackendTest, AnEdgeIsAcknowledgedSoThatTheLoopRests) {
+  make_watched_input();
+  line("1").edge(1);
+  EXPECT_EQ(serve(), 1);
+  EXPECT_FALSE(line("1").signals());
+  EXPECT_EQ(seams().alive_fd_watches(), 1);
+}
+
+TEST_F(GpioBackendTest, AnEdgeIsAcknowledgedWhileEventsAreOff) {
+  io_port_set_events_enabled(make_watched_input(), false);
+  line("1").edge(1);
+  EXPECT_EQ(serve(), 1);
+  EXPECT_FALSE(line("1").signals());
+  EXPECT_TRUE(reported.empty());
+}
+
+TEST_F(GpioBackendTest, AnEdgeIsAcknowledgedWhileThePortCountsAsNotSetUp) {
+  const PortFunctions *functions = gpio_backend_functions(make_input());
+  EXPECT_TRUE(functions->setup(port(), false));
+  functions->start_watch(port());
+  line("1").edge(1);
+  EXPECT_EQ(serve(), 1);
+  EXPECT_FALSE(line("1").signals());
+  EXPECT_EQ(reported, States{false});
+}
+
+TEST_F(GpioBackendTest, AClientThatReadsFirstDoesNotSwallowTheChange) {
+  make_watched_input();
+  EXPECT_FALSE(io_port_get_state(port()));
+  line("1").edge(1);
+  EXPECT_TRUE(io_port_get_state(port()));
+  EXPECT_FALSE(line("1").signals());
+  EXPECT_EQ(serve(), 1);
+  EXPECT_EQ(reported, States{true});
+}
+
+TEST_F(GpioBackendTest, AClientThatReadsDuringTheEdgeCausesNoSecondReport) {
+  make_watched_input();
+  EXPECT_FALSE(io_port_get_state(port()));
+  line("1").acknowledges = false;
+  line("1").edge(1);
+  EXPECT_TRUE(io_port_get_state(port()));
+  line("1").acknowledges = true;
+  EXPECT_EQ(serve(), 1);
+  EXPECT_EQ(reported, States{true});
+}
+
+TEST_F(GpioBackendTest, APortHasOneWatchAfterAnyNumberOfAnnouncementsAndDirections) {
+  EXPECT_TRUE(io_port_setup(make_configurable()));
+  for (int i = 0; i < 5; ++i) {
+    io_port_set_watch(port());
+    EXPECT_EQ(seams().alive_fd_watches(), 1);
+    EXPECT_TRUE(io_port_set_direction(port(), false));
+    EXPECT_EQ(seams().alive_fd_watches(), 0);
+    EXPECT_TRUE(io_port_set_direction(port(), true));
+    EXPECT_EQ(seams().alive_fd_watches(), 1);
+  }
+  take_reported();
+  line("1").edge(1);
+  serve();
+  EXPECT_EQ(reported, States{true});
+}
+
+TEST_F(GpioBackendTest, AnEdgeThatWaitsDuringARepeatedAnnouncementIsReported) {
+  make_watched_input();
+  line("1").edge(1);
+  io_port_set_watch(port());
+  serve();
+  EXPECT_EQ(reported, States{true});
+}
+
+TEST_F(GpioBackendTest, AnOutputIsNotWatched) {
+  EXPECT_TRUE(io_port_setup(make_output()));
+  io_port_set_watch(port());
+  EXPECT_TRUE(seams().fd_watches.empty());
+}
+
+// --- Lines that fail or go away while they are watched ---
+
+TEST_F(GpioBackendTest, AnUnreadableLineIsReportedActiveAndDoesNotSpin) {
+  make_watched_input();
+  line("1").read_error = ENODEV;
+  line("1").acknowledges = false;
+  line("1").signal();
+  EXPECT_TRUE(g_main_context_iteration(nullptr, FALSE));
+  EXPECT_EQ(reported, States{true});
+  EXPECT_EQ(seams().alive_fd_watches(), 0);
+  EXPECT_EQ(seams().intervals, std::vector<guint>{1000});
+  serve(5);
+  EXPECT_EQ(reported, States{true}) << "looking again is no news";
+}
+
+TEST_F(GpioBackendTest, ALineThatBecomesReadableAgainIsReportedAndWatched) {
+  make_watched_input();
+  line("1").read_error = EIO;
+  line("1").signal();
+  EXPECT_TRUE(g_main_context_iteration(nullptr, FALSE));
+  EXPECT_EQ(take_reported(), States{true});
+  line("1").read_error = 0;
+  serve();
+  EXPECT_EQ(take_reported(), States{false});
+  line("1").edge(1);
+  serve();
+  EXPECT_EQ(take_reported(), States{true});
+}
+
+TEST_F(GpioBackendTest, AfterAnUnacknowledgedFailureTheWatchComesBackWithTheLine) {
+  make_watched_input();
+  line("1").read_error = ENODEV;
+  line("1").acknowledges = false;
+  line("1").signal();
+  EXPECT_TRUE(g_main_context_iteration(nullptr, FALSE));
+  line("1").read_error = 0;
+  line("1").acknowledges = true;
+  serve();
+  EXPECT_EQ(seams().alive_fd_watches(), 1);
+  EXPECT_EQ(take_reported(), (States{true, false}));
+}
+
+TEST_F(GpioBackendTest, ADescriptorThatHangsUpIsNoLongerWatched) {
+  EXPECT_TRUE(io_port_setup(make_input()));
+  line("1").hang_up();
+  io_port_set_watch(port());
+  EXPECT_EQ(serve(), 1);
+  EXPECT_EQ(seams().alive_fd_watches(), 0);
+  EXPECT_TRUE(reported.empty());
+}
+
+TEST_F(GpioBackendTest, ADescriptorThatIsGoneIsNoLongerWatched) {
+  make_watched_input();
+  line("1").vanish();
+  EXPECT_EQ(serve(), 1);
+  EXPECT_EQ(seams().alive_fd_watches(), 0);
+  EXPECT_EQ(log.count("Port terminal: the line is gone and no longer watched"), 1);
+}
+
+// --- Dropping and coming back ---
+
+TEST_F(GpioBackendTest, DroppingThePortGivesItsLinesBackAndEndsItsWatch) {
+  EXPECT_TRUE(io_port_setup(make_configurable()));
+  io_port_set_watch(port());
+  line("1").signal();
+  io_port_drop(port());
+  EXPECT_EQ(fake_ugpio().requested, 0);
+  EXPECT_EQ(seams().alive_fd_watches(), 0);
+  EXPECT_EQ(serve(), 0);
+}
+
+TEST_F(GpioBackendTest, ADroppedPortTakesEveryCall) {
+  EXPECT_TRUE(io_port_setup(make_configurable()));
+  io_port_drop(port());
+  io_port_set_watch(port());
+  EXPECT_FALSE(io_port_get_state(port()));
+  EXPECT_TRUE(io_port_set_direction(port(), false));
+  EXPECT_FALSE(io_port_set_state(port(), true));
+  EXPECT_TRUE(io_port_set_activelow(port(), true, false));
+}
+
+TEST_F(GpioBackendTest, ADroppedPortCanBeSetUpAgain) {
+  make(PORT_INPUT, {{"input", "alias", "alarm"}, {"input", "inverted", "true"}});
+  EXPECT_TRUE(io_port_setup(port()));
+  io_port_drop(port());
+  fake_ugpio().take_calls();
+  EXPECT_TRUE(io_port_setup(port()));
+  EXPECT_EQ(fake_ugpio().calls, (Calls{"request_one_named alarm 0x14D", "activelow alarm 1"}));
+  io_port_set_watch(port());
+  line("alarm").edge(1);
+  serve();
+  EXPECT_EQ(reported, States{true});
+}
+
+// --- Threads ---
+
+TEST_F(GpioBackendTest, AnActionThreadDrivesWhileTheMainThreadReads) {
+  EXPECT_TRUE(io_port_setup(make_output()));
+  port_listener().port_changed = nullptr;
+  std::thread action([this] {
+    for (int i = 0; i < 1000; ++i) {
+      io_port_set_state(port(), i % 2 == 0);
+    }
+    io_port_set_state(port(), true);
+  });
+  for (int i = 0; i < 1000; ++i) {
+    (void)io_port_get_state(port());
+  }
+  action.join();
+  EXPECT_TRUE(io_port_get_state(port()));
+}
+
+}  // namespace

@@ -1,0 +1,124 @@
+#include "kernel-tree.h"
+
+#include <glib.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <filesystem>
+#include <fstream>
+#include <sstream>
+
+#include "platform/host/ugpio-host.h"
+
+namespace fs = std::filesystem;
+
+// The linker's option --wrap gives the calls and the real functions these names.
+ssize_t fake_write(int fd, const void *data, size_t size) asm("__wrap_write");
+ssize_t real_write(int fd, const void *data, size_t size) asm("__real_write");
+void fake_usleep(gulong microseconds) asm("__wrap_g_usleep");
+gint64 fake_monotonic_time() asm("__wrap_g_get_monotonic_time");
+
+namespace {
+
+constexpr const char *kClass = "class/gpio/";
+
+KernelTree *current = nullptr;
+
+// The file's name within class/gpio of the tree; empty for files elsewhere.
+std::string tree_file(int fd) {
+  std::error_code error;
+  const std::string path = fs::read_symlink("/proc/self/fd/" + std::to_string(fd), error).string();
+  const std::string base = ugpio_host_root() + "/" + kClass;
+  return path.starts_with(base) ? path.substr(base.size()) : "";
+}
+
+}  // namespace
+
+KernelTree::KernelTree() {
+  std::string path = (fs::temp_directory_path() / "portd-gpio-XXXXXX").string();
+  root_ = g_mkdtemp(path.data());
+  // Tests that do without root's rights must still come in.
+  fs::permissions(root_, fs::perms(0755));
+  ugpio_host_set_root(root_);
+  write_file(std::string(kClass) + "export", "");
+  write_file(std::string(kClass) + "unexport", "");
+  current = this;
+}
+
+KernelTree::~KernelTree() {
+  current = nullptr;
+  ugpio_host_set_root("/sys");
+  std::error_code error;
+  fs::remove_all(root_, error);
+}
+
+void KernelTree::make_line(const std::string &number) {
+  for (const auto &[name, text] : attributes) {
+    write_file(kClass + ("gpio" + number) + "/" + name, text);
+  }
+}
+
+void KernelTree::write_file(const std::string &path, const std::string &text) const {
+  fs::create_directories(fs::path(full(path)).parent_path());
+  std::ofstream(full(path)) << text;
+}
+
+std::string KernelTree::read_file(const std::string &path) const {
+  std::ostringstream text;
+  text << std::ifstream(full(path)).rdbuf();
+  return text.str();
+}
+
+void KernelTree::remove(const std::string &path) const {
+  fs::remove_all(full(path));
+}
+
+void KernelTree::set_mode(const std::string &path, unsigned int mode) const {
+  fs::permissions(full(path), fs::perms(mode));
+}
+
+void KernelTree::make_link(const std::string &path, const std::string &target) const {
+  fs::create_directories(fs::path(full(path)).parent_path());
+  fs::create_directory_symlink(full(target), full(path));
+}
+
+int KernelTree::on_write(const std::string &file, const std::string &text) {
+  writes.push_back(file + " " + text);
+  if (file == "export" && on_export) {
+    on_export();
+  }
+  const auto error = errors.find(fs::path(file).filename().string());
+  if (error != errors.end()) {
+    return error->second;
+  }
+  if (file == "export" && exports) {
+    make_line(text);
+  } else if (file == "unexport") {
+    remove(kClass + ("gpio" + text));
+  }
+  return 0;
+}
+
+ssize_t fake_write(int fd, const void *data, size_t size) {
+  const std::string file = current ? tree_file(fd) : "";
+  if (!file.empty()) {
+    if (const int error =
+            current->on_write(file, std::string(static_cast<const char *>(data), size))) {
+      errno = error;
+      return -1;
+    }
+  }
+  return real_write(fd, data, size);
+}
+
+void fake_usleep(gulong microseconds) {
+  current->slept += static_cast<long>(microseconds);
+  if (current->on_sleep) {
+    current->on_sleep();
+  }
+}
+
+gint64 fake_monotonic_time() {
+  constexpr gint64 kStart = 1000 * G_TIME_SPAN_SECOND;
+  return kStart + (current ? current->slept : 0);
+}

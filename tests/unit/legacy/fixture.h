@@ -1,0 +1,42 @@
+// What the tests of the legacy bridge share: ports in the registry, files, and the log.
+#pragma once
+
+#include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
+
+#include "backends/check-backend.h"
+#include "port/ioport.h"
+
+// Ports on the check backend, in an otherwise empty registry.
+class LegacyTest : public testing::Test {
+ public:
+  LegacyTest(const LegacyTest &) = delete;
+  LegacyTest &operator=(const LegacyTest &) = delete;
+
+ protected:
+  LegacyTest();
+  ~LegacyTest() override;
+
+  // The registry keeps the port for as long as the test runs.
+  static IOPort *add_port(int number, PortType type, const char *flag = "ioport");
+  // Writes a file that goes with the test, and gives its path.
+  std::string write_file(const char *name, const std::string &contents);
+  std::string path_of(const char *name) const;
+  // Everything logged so far, as "level: text".
+  const std::vector<std::string> &log() const { return log_; }
+
+ private:
+  static void on_log(const char *domain, GLogLevelFlags level, const char *message,
+                     gpointer user_data);
+
+  std::string directory_;
+  std::vector<std::string> files_;
+  std::vector<std::string> log_;
+  GLogFunc previous_handler_;
+};
+
+std::string read_file(const std::string &path);
+std::string input_name(const IOPort *ioport);
+std::string output_name(const IOPort *ioport);

@@ -1,0 +1,115 @@
+// Putting the objects on a connection, and the failures that end the daemon.
+#include <sys/socket.h>
+
+#include <array>
+
+#include "dbus/iocontrol-conf-legacy-dbus.h"
+#include "dbus/legacy-controller.h"
+#include "fixture.h"
+
+namespace {
+
+// A connection without a bus, and without anybody who listens at its other end.
+class Wire {
+ public:
+  Wire() {
+    socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends_.data());
+    const GObjectPtr<GSocket> socket(g_socket_new_from_fd(ends_[0], nullptr));
+    const GObjectPtr<GSocketConnection> stream(
+        g_socket_connection_factory_create_connection(socket.get()));
+    connection_.reset(g_dbus_connection_new_sync(G_IO_STREAM(stream.get()), nullptr,
+                                                 G_DBUS_CONNECTION_FLAGS_NONE, nullptr, nullptr,
+                                                 nullptr));
+  }
+  ~Wire() {
+    g_dbus_connection_close_sync(connection_.get(), nullptr, nullptr);
+    close(ends_[1]);
+  }
+  Wire(const Wire &) = delete;
+  Wire &operator=(const Wire &) = delete;
+
+  GDBusConnection *connection() const { return connection_.get(); }
+
+ private:
+  std::array<int, 2> ends_{};
+  GObjectPtr<GDBusConnection> connection_;
+};
+
+class ObjectsTest : public LegacyTest {
+ protected:
+  ObjectsTest() {
+    GTEST_FLAG_SET(death_test_style, "threadsafe");
+    controller_.connection.reset(G_DBUS_CONNECTION(g_object_ref(wire_.connection())));
+    controller_.introspection = legacy_introspection_parse(kLegacyIntrospection);
+  }
+
+  Wire wire_;
+  LegacyController controller_;
+};
+
+TEST_F(ObjectsTest, each_port_has_the_interfaces_of_its_type) {
+  add_port(0, PORT_INPUT);
+  add_port(1, PORT_OUTPUT);
+  add_port(2, PORT_CONFIGURABLE);
+  add_port(5, PORT_CONFIGURABLE);  // more than older tools know of
+  add_port(-1, PORT_INPUT);
+  legacy_register_objects(controller_);
+  EXPECT_EQ(controller_.object_ids.size(), 2U + 2U + 3U);
+  unreg_port_objects(controller_);
+  EXPECT_TRUE(controller_.object_ids.empty());
+}
+
+TEST_F(ObjectsTest, unregistering_makes_room) {
+  add_port(0, PORT_INPUT);
+  for (int round = 0; round < 3; ++round) {
+    legacy_register_objects(controller_);
+    unreg_port_objects(controller_);
+  }
+}
+
+TEST_F(ObjectsTest, unregistering_twice_is_told) {
+  controller_.object_ids = {12345};
+  testing::internal::CaptureStderr();
+  unreg_port_objects(controller_);
+  EXPECT_EQ(testing::internal::GetCapturedStderr(),
+            "unreg_port_objects@627: Failed to unregister object\n");
+}
+
+TEST_F(ObjectsTest, object_that_is_there_already) {
+  ASSERT_TRUE(iocontrol_conf_legacy_dbus_register_object(controller_, 3, LEGACY_INTERFACE_OUTPUT));
+  testing::internal::CaptureStderr();
+  EXPECT_FALSE(iocontrol_conf_legacy_dbus_register_object(controller_, 3, LEGACY_INTERFACE_OUTPUT));
+  const std::string said = testing::internal::GetCapturedStderr();
+  EXPECT_TRUE(said.starts_with("iocontrol_conf_legacy_dbus_register_object@487: Error: \""))
+      << said;
+  EXPECT_TRUE(said.ends_with("\" when registering DBUS object for port 3\n")) << said;
+  unreg_port_objects(controller_);
+}
+
+using ObjectsDeathTest = ObjectsTest;
+
+TEST_F(ObjectsDeathTest, registration_that_fails) {
+  add_port(0, PORT_INPUT);
+  ASSERT_TRUE(iocontrol_conf_legacy_dbus_register_object(controller_, 0, LEGACY_INTERFACE_INPUT));
+  g_log_set_default_handler(g_log_default_handler, nullptr);
+  EXPECT_DEATH(legacy_register_objects(controller_), "Unable to register objects on DBus");
+  unreg_port_objects(controller_);
+}
+
+TEST_F(ObjectsDeathTest, introspection_that_cannot_be_parsed) {
+  g_log_set_default_handler(g_log_default_handler, nullptr);
+  EXPECT_DEATH(legacy_introspection_parse("<node><interface"),
+               "Unable to register objects on DBus");
+}
+
+TEST_F(ObjectsDeathTest, no_bus) {
+  g_log_set_default_handler(g_log_default_handler, nullptr);
+  EXPECT_DEATH(
+      {
+        g_setenv("DBUS_SYSTEM_BUS_ADDRESS", "unix:path=/nonexistent/bus", TRUE);
+        iocontrol_conf_legacy_dbus_create();
+      },
+      "Failed to connect to system bus: ");
+}
+
+}  // namespace
