@@ -164,7 +164,7 @@ TEST_F(Gpio, SettingUpAnOutputThatTheUserMadeActiveLowDoesNotGlitch) {
   const LineHistory history;
   restart();
   EXPECT_FALSE(client_.state(2));
-  EXPECT_EQ(LineHistory::of(sim_.number(kOutput)), (Entries{"in", "set 1", "out"}));
+  EXPECT_EQ(LineHistory::of(sim_.number(kOutput)), (Entries{"set 1", "out"}));
 }
 
 TEST_F(Gpio, AKilledDaemonLeavesAnOutputOnAndTheNextTurnsItOffOnce) {
