@@ -5,7 +5,8 @@
  * Writing in_voltageN_raw sets what the channel converts to. A channel behaves like a converter that
  * samples all the time: each time its value, a threshold or an enable bit is written, every enabled
  * threshold that the value lies beyond raises its event. A buffered scan holds the same values in the
- * format that the module's parameters give.
+ * format that the module's parameters give. Writing 0 and 1 to the parameter "plugged" takes the
+ * converters away and brings them back, whoever has them open.
  */
 #include <linux/module.h>
 #include <linux/platform_device.h>
@@ -64,6 +65,7 @@ struct mock_adc {
 	int integration_us;
 };
 
+static const char *const names[MAX_DEVICES] = { "mock-adc0", "mock-adc1" };
 static struct platform_device *platform;
 static struct iio_dev *adcs[MAX_DEVICES];
 static struct iio_chan_spec channel_specs[CHANNELS + 1];
@@ -286,7 +288,7 @@ static void describe_channels(void)
 
 static struct iio_dev *add_adc(unsigned int number)
 {
-	struct iio_dev *adc = devm_iio_device_alloc(&platform->dev, sizeof(struct mock_adc));
+	struct iio_dev *adc = iio_device_alloc(&platform->dev, sizeof(struct mock_adc));
 	struct mock_adc *mock;
 	int ret;
 
@@ -294,20 +296,21 @@ static struct iio_dev *add_adc(unsigned int number)
 		return ERR_PTR(-ENOMEM);
 	mock = iio_priv(adc);
 	mutex_init(&mock->lock);
-	adc->name = devm_kasprintf(&platform->dev, GFP_KERNEL, "mock-adc%u", number);
+	adc->name = names[number];
 	adc->info = &mock_info;
 	adc->modes = INDIO_DIRECT_MODE;
 	adc->channels = channel_specs;
 	adc->num_channels = ARRAY_SIZE(channel_specs);
 	ret = iio_triggered_buffer_setup(adc, iio_pollfunc_store_time, scan, NULL);
 	if (ret)
-		return ERR_PTR(ret);
+		goto no_buffer;
 	ret = iio_device_register(adc);
-	if (ret) {
-		iio_triggered_buffer_cleanup(adc);
-		return ERR_PTR(ret);
-	}
-	return adc;
+	if (!ret)
+		return adc;
+	iio_triggered_buffer_cleanup(adc);
+no_buffer:
+	iio_device_free(adc);
+	return ERR_PTR(ret);
 }
 
 static void remove_adcs(void)
@@ -317,28 +320,15 @@ static void remove_adcs(void)
 	for (i = 0; i < MAX_DEVICES && adcs[i]; i++) {
 		iio_device_unregister(adcs[i]);
 		iio_triggered_buffer_cleanup(adcs[i]);
+		iio_device_free(adcs[i]);
+		adcs[i] = NULL;
 	}
-	platform_device_unregister(platform);
 }
 
-static bool parameters_make_sense(void)
-{
-	bool whole = storagebits == 8 || storagebits == 16 || storagebits == 32;
-
-	return devices >= 1 && devices <= MAX_DEVICES && whole && realbits >= 1 &&
-	       realbits + shift <= storagebits;
-}
-
-static int __init mock_iio_init(void)
+static int add_adcs(void)
 {
 	unsigned int i;
 
-	if (!parameters_make_sense())
-		return -EINVAL;
-	platform = platform_device_register_simple("mock-iio", PLATFORM_DEVID_NONE, NULL, 0);
-	if (IS_ERR(platform))
-		return PTR_ERR(platform);
-	describe_channels();
 	for (i = 0; i < devices; i++) {
 		struct iio_dev *adc = add_adc(i);
 
@@ -351,7 +341,64 @@ static int __init mock_iio_init(void)
 	return 0;
 }
 
+static int plugged_set(const char *text, const struct kernel_param *param)
+{
+	bool plug;
+	int ret = kstrtobool(text, &plug);
+
+	if (ret || !platform)
+		return ret ? ret : -ENODEV;
+	if (plug == !!adcs[0])
+		return 0;
+	if (plug)
+		return add_adcs();
+	remove_adcs();
+	return 0;
+}
+
+static int plugged_get(char *buffer, const struct kernel_param *param)
+{
+	return sysfs_emit(buffer, "%d\n", adcs[0] ? 1 : 0);
+}
+
+static const struct kernel_param_ops plugged_ops = {
+	.set = plugged_set,
+	.get = plugged_get,
+};
+module_param_cb(plugged, &plugged_ops, NULL, 0644);
+MODULE_PARM_DESC(plugged, "whether the converters are there");
+
+static bool parameters_make_sense(void)
+{
+	bool whole = storagebits == 8 || storagebits == 16 || storagebits == 32;
+
+	return devices >= 1 && devices <= MAX_DEVICES && whole && realbits >= 1 &&
+	       realbits + shift <= storagebits;
+}
+
+static int __init mock_iio_init(void)
+{
+	int ret;
+
+	if (!parameters_make_sense())
+		return -EINVAL;
+	platform = platform_device_register_simple("mock-iio", PLATFORM_DEVID_NONE, NULL, 0);
+	if (IS_ERR(platform))
+		return PTR_ERR(platform);
+	describe_channels();
+	ret = add_adcs();
+	if (ret)
+		platform_device_unregister(platform);
+	return ret;
+}
+
+static void __exit mock_iio_exit(void)
+{
+	remove_adcs();
+	platform_device_unregister(platform);
+}
+
 module_init(mock_iio_init);
-module_exit(remove_adcs);
+module_exit(mock_iio_exit);
 MODULE_DESCRIPTION("IIO converters without hardware, for tests");
 MODULE_LICENSE("GPL");

@@ -74,7 +74,7 @@ void Daemon::install(const std::string &ports) {
   write_text(kSettings, "");
 }
 
-void Daemon::start() {
+void Daemon::launch() {
   ASSERT_FALSE(running());
   posix_spawn_file_actions_t actions;
   posix_spawn_file_actions_init(&actions);
@@ -86,6 +86,10 @@ void Daemon::start() {
   const int error = posix_spawn(&pid_, kProgram, &actions, nullptr, arguments.data(), environ);
   posix_spawn_file_actions_destroy(&actions);
   ASSERT_EQ(error, 0) << g_strerror(error);
+}
+
+void Daemon::start() {
+  launch();
   Client client;
   ASSERT_TRUE(wait_until([&] { return client.answers(); })) << log();
 }
@@ -100,6 +104,11 @@ int Daemon::wait_for_end() {
     waitpid(pid, &status, 0);
   }
   return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+}
+
+int Daemon::run_to_end() {
+  launch();
+  return wait_for_end();
 }
 
 int Daemon::stop() {

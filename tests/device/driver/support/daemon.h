@@ -23,6 +23,8 @@ class Daemon {
   static void install(const std::string &ports);
   // Starts the daemon and waits until it answers on the bus.
   void start();
+  // For a daemon that does not get that far: its exit status, or -1 when a signal ended it.
+  int run_to_end();
   // SIGTERM; the exit status, or -1 when a signal ended it.
   int stop();
   void kill_hard();
@@ -37,6 +39,7 @@ class Daemon {
   static bool logged(const std::string &text);
 
  private:
+  void launch();
   int wait_for_end();
   pid_t pid_ = 0;
 };
