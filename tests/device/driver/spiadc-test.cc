@@ -43,6 +43,7 @@ TEST_F(SpiAdc, BoundariesShiftByTheHysteresis) {
   EXPECT_EQ(after(2000), 1);
   EXPECT_EQ(after(2050), 1);
   EXPECT_EQ(after(2051), 0);
+  client_.catch_up();
   EXPECT_EQ(client_.count_changes(0), 4);
 }
 

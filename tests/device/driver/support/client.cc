@@ -189,6 +189,19 @@ bool Client::answers() {
          call_supervised("GetNumberOfPorts", nullptr, &supervised);
 }
 
+// Signals that were sent before an answer are there before the answer.
+void Client::catch_up() {
+  std::string ignored;
+  call("GetNbrPorts", nullptr, &ignored);
+  while (g_main_context_iteration(nullptr, FALSE) == TRUE) {
+  }
+}
+
+void Client::forget_changes() {
+  catch_up();
+  changes_.clear();
+}
+
 int Client::count_changes(int port) const {
   return static_cast<int>(std::count_if(changes_.begin(), changes_.end(),
                                         [&](const auto &change) { return change.number == port; }));

@@ -47,13 +47,16 @@ class Client {
   std::vector<std::string> ports();
   bool answers();
 
-  // What PortChanged said since the last call of forget_changes(), in order.
+  // What PortChanged said since the last call of forget_changes(), in order, as far as the main loop
+  // has run.
   const std::vector<PortChange> &changes() const { return changes_; }
   int count_changes(int port) const;
   // -1: none yet.
   int last_reported(int port) const;
   int sequences_done() const { return sequences_done_; }
-  void forget_changes() { changes_.clear(); }
+  // Takes in everything that the daemon has said up to now.
+  void catch_up();
+  void forget_changes();
 
   // The answer to a call on the control interface; empty after an error, which is then in `error`.
   GVariantPtr call(const char *method, GVariant *arguments, std::string *error = nullptr);
