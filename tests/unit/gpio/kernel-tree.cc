@@ -21,6 +21,7 @@ gint64 fake_monotonic_time() asm("__wrap_g_get_monotonic_time");
 namespace {
 
 constexpr const char *kClass = "class/gpio/";
+constexpr gint64 kStart = 1000 * G_TIME_SPAN_SECOND;
 
 KernelTree *current = nullptr;
 
@@ -28,7 +29,7 @@ KernelTree *current = nullptr;
 std::string tree_file(int fd) {
   std::error_code error;
   const std::string path = fs::read_symlink("/proc/self/fd/" + std::to_string(fd), error).string();
-  const std::string base = ugpio_host_root() + "/" + kClass;
+  const std::string base = (fs::path(ugpio_host_root()) / kClass).string();
   return path.starts_with(base) ? path.substr(base.size()) : "";
 }
 
@@ -54,7 +55,7 @@ KernelTree::~KernelTree() {
 
 void KernelTree::make_line(const std::string &number) {
   for (const auto &[name, text] : attributes) {
-    write_file(kClass + ("gpio" + number) + "/" + name, text);
+    write_file((fs::path(kClass) / ("gpio" + number) / name).string(), text);
   }
 }
 
@@ -101,7 +102,7 @@ int KernelTree::on_write(const std::string &file, const std::string &text) {
 
 ssize_t fake_write(int fd, const void *data, size_t size) {
   const std::string file = current ? tree_file(fd) : "";
-  if (!file.empty()) {
+  if (current && !file.empty()) {
     if (const int error =
             current->on_write(file, std::string(static_cast<const char *>(data), size))) {
       errno = error;
@@ -119,6 +120,5 @@ void fake_usleep(gulong microseconds) {
 }
 
 gint64 fake_monotonic_time() {
-  constexpr gint64 kStart = 1000 * G_TIME_SPAN_SECOND;
   return kStart + (current ? current->slept : 0);
 }
