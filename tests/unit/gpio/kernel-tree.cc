@@ -15,6 +15,10 @@ namespace fs = std::filesystem;
 // The linker's option --wrap gives the calls and the real functions these names.
 ssize_t fake_write(int fd, const void *data, size_t size) asm("__wrap_write");
 ssize_t real_write(int fd, const void *data, size_t size) asm("__real_write");
+// Large files have calls of their own on some machines.
+ssize_t fake_pread(int fd, void *data, size_t size, off_t offset) asm("__wrap_pread");
+ssize_t fake_pread64(int fd, void *data, size_t size, off64_t offset) asm("__wrap_pread64");
+ssize_t real_pread64(int fd, void *data, size_t size, off64_t offset) asm("__real_pread64");
 void fake_usleep(gulong microseconds) asm("__wrap_g_usleep");
 gint64 fake_monotonic_time() asm("__wrap_g_get_monotonic_time");
 
@@ -110,6 +114,17 @@ ssize_t fake_write(int fd, const void *data, size_t size) {
     }
   }
   return real_write(fd, data, size);
+}
+
+ssize_t fake_pread64(int fd, void *data, size_t size, off64_t offset) {
+  if (current) {
+    ++current->reads;
+  }
+  return real_pread64(fd, data, size, offset);
+}
+
+ssize_t fake_pread(int fd, void *data, size_t size, off_t offset) {
+  return fake_pread64(fd, data, size, offset);
 }
 
 void fake_usleep(gulong microseconds) {
