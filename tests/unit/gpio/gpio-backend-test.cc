@@ -428,6 +428,18 @@ TEST_F(GpioBackendTest, ALineThatBecomesReadableAgainIsReportedAndWatched) {
   EXPECT_EQ(take_reported(), States{true});
 }
 
+TEST_F(GpioBackendTest, AClientWhoseReadFailsDoesNotSwallowTheChange) {
+  make_watched_input();
+  line("1").edge(1);
+  line("1").read_error = EIO;
+  EXPECT_TRUE(io_port_get_state(port()));
+  EXPECT_FALSE(line("1").signals());
+  EXPECT_EQ(seams().intervals, std::vector<guint>{1000});
+  line("1").read_error = 0;
+  serve();
+  EXPECT_EQ(reported, States{true});
+}
+
 TEST_F(GpioBackendTest, AfterAnUnacknowledgedFailureTheWatchComesBackWithTheLine) {
   make_watched_input();
   line("1").read_error = ENODEV;

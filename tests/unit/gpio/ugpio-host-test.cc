@@ -273,6 +273,12 @@ TEST_F(UgpioHostTest, TheValueIsReadFromTheStartEveryTime) {
   EXPECT_EQ(ugpio_get_value(context.get()), 1);
 }
 
+// The kernel signals on every descriptor that was never read.
+TEST_F(UgpioHostTest, AnOpenedLineHasBeenReadSoThatItSignalsOnlyEdges) {
+  const ContextPtr context = open(kInput);
+  EXPECT_EQ(tree.reads, 1);
+}
+
 TEST_F(UgpioHostTest, AValueThatIsNoLevelCannotBeRead) {
   const ContextPtr context = open(kInput);
   for (const char *text : {"", "x\n", "\n", "-1\n"}) {
