@@ -11,7 +11,7 @@ struct Backend {
 constexpr Backend kBackends[] = {
     {"spi", 3, supervised_spi_backend_functions},
     {"iio", 4, supervised_iio_backend_functions},
-    {"iio-interrupt", 5, nullptr},
+    {"iio-interrupt", 5, supervised_iio_interrupt_backend_functions},
 };
 
 }  // namespace

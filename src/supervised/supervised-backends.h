@@ -10,4 +10,5 @@ void supervised_backends_register();
 // The table-making function of each backend: it gives the port its private record if it has none
 // and returns the backend's one operations table.
 const PortFunctions *supervised_iio_backend_functions(IOPort *port);
+const PortFunctions *supervised_iio_interrupt_backend_functions(IOPort *port);
 const PortFunctions *supervised_spi_backend_functions(IOPort *port);

@@ -4,7 +4,7 @@
 #include <memory>
 
 #include "base/glib-ptr.h"
-#include "platform/configevent.h"
+#include "platform/configuration-event.h"
 #include "platform/event.h"
 
 using ProducerPtr = std::unique_ptr<EventProducer, GlibDeleter<event_producer_free>>;

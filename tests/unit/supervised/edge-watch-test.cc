@@ -2,7 +2,7 @@
 #include <glib-unix.h>
 
 #include "support/bench.h"
-#include "support/fake-spidev.h"
+#include "support/fake-ioctl.h"
 
 namespace {
 

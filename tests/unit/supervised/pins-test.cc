@@ -1,6 +1,6 @@
 // The control pins: exactly one of them is on while a port is an input, none while it is an output.
 #include "support/bench.h"
-#include "support/fake-spidev.h"
+#include "support/fake-ioctl.h"
 
 namespace {
 

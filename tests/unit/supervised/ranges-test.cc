@@ -6,7 +6,7 @@
 #include "port/port-error.h"
 #include "supervised/supervised-utils.h"
 #include "support/bench.h"
-#include "support/fake-spidev.h"
+#include "support/fake-ioctl.h"
 
 namespace {
 

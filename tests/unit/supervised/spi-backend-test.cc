@@ -5,7 +5,7 @@
 #include "port/port-error.h"
 #include "supervised/supervised-backends.h"
 #include "support/bench.h"
-#include "support/fake-spidev.h"
+#include "support/fake-ioctl.h"
 
 namespace {
 

@@ -1,4 +1,5 @@
-// A spidev as the test wants it: every ioctl of the process comes here.
+// A spidev as the test wants it: every ioctl of the process comes here. A character device of an
+// industrial I/O converter gives out the FIFO beside it, "<path>.events", as its event descriptor.
 #pragma once
 
 #include <cstdint>

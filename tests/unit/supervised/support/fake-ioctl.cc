@@ -1,12 +1,14 @@
-#include "support/fake-spidev.h"
+#include "support/fake-ioctl.h"
 
 #include <fcntl.h>
+#include <linux/iio/events.h>
 #include <linux/spi/spidev.h>
 #include <sys/ioctl.h>
 #include <sys/syscall.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <climits>
 #include <cstdarg>
 #include <cstring>
 #include <sstream>
@@ -41,6 +43,16 @@ int transfer(const spi_ioc_transfer *transfers) {
   return finish(device.transfer_error, call.str());
 }
 
+int event_descriptor(int fd, int *events) {
+  char path[PATH_MAX] = "";
+  const std::string link = "/proc/self/fd/" + std::to_string(fd);
+  const ssize_t length = readlink(link.c_str(), path, sizeof path - 1);
+  const std::string fifo =
+      std::string(path, length > 0 ? static_cast<size_t>(length) : 0) + ".events";
+  *events = open(fifo.c_str(), O_RDONLY | O_NONBLOCK);
+  return *events < 0 ? -1 : 0;
+}
+
 }  // namespace
 
 FakeSpidev &fake_spidev() {
@@ -63,6 +75,9 @@ extern "C" int ioctl(int fd, unsigned long request, ...) noexcept {
   if (request == SPI_IOC_WR_MAX_SPEED_HZ) {
     return finish(fake_spidev().speed_error,
                   "speed " + std::to_string(*static_cast<std::uint32_t *>(argument)));
+  }
+  if (request == IIO_GET_EVENT_FD_IOCTL) {
+    return event_descriptor(fd, static_cast<int *>(argument));
   }
   if (request == SPI_IOC_MESSAGE(2)) {
     return transfer(static_cast<const spi_ioc_transfer *>(argument));

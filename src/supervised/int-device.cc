@@ -1,0 +1,188 @@
+#include "supervised/int-device.h"
+
+#include <fcntl.h>
+#include <glib-unix.h>
+#include <linux/iio/events.h>
+#include <sys/ioctl.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <mutex>
+#include <utility>
+#include <vector>
+
+#include "base/glib-ptr.h"
+#include "base/log.h"
+
+namespace {
+
+struct Watched {
+  IntListener listener;
+  const IntDevice *device;
+};
+
+std::mutex devices_lock;
+std::vector<std::weak_ptr<IntDevice>> devices;
+std::vector<Watched> watched_ports;
+
+IntDevicePtr find_device(const std::string &path) {
+  std::erase_if(devices, [](const auto &device) { return device.expired(); });
+  for (const auto &entry : devices) {
+    IntDevicePtr device = entry.lock();
+    if (device && device->path == path && device->events) {
+      return device;
+    }
+  }
+  return nullptr;
+}
+
+// The descriptor is read when there is an event, yet a read must never block the daemon.
+UniqueFd get_event_descriptor(const UniqueFd &node) {
+  int fd = -1;
+  if (ioctl(node.get(), IIO_GET_EVENT_FD_IOCTL, &fd) < 0 || fd < 0) {
+    log_critical("Failed to open device: %s", g_strerror(errno));
+    return UniqueFd();
+  }
+  UniqueFd events(fd);
+  Error error;
+  if (!g_unix_set_fd_nonblocking(fd, TRUE, error.out()) || fcntl(fd, F_SETFD, FD_CLOEXEC) < 0) {
+    log_warning("Could not prepare the event descriptor: %s", g_strerror(errno));
+  }
+  return events;
+}
+
+UniqueFd open_events(const std::string &path) {
+  const UniqueFd node(open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+  if (!node) {
+    log_critical("Failed to open device %s: %s", path.c_str(), g_strerror(errno));
+    return UniqueFd();
+  }
+  return get_event_descriptor(node);
+}
+
+auto find_watched(const IOPort *port) {
+  return std::find_if(watched_ports.begin(), watched_ports.end(),
+                      [&](const Watched &watched) { return watched.listener.port == port; });
+}
+
+// Takes the device out of service; its ports open it anew when they find it again.
+std::vector<IntListener> retire(IntDevice *device) {
+  std::vector<IntListener> listeners;
+  std::erase_if(watched_ports, [&](const Watched &watched) {
+    if (watched.device == device) {
+      listeners.push_back(watched.listener);
+    }
+    return watched.device == device;
+  });
+  device->users = 0;
+  device->watch.reset();
+  device->events.reset();
+  return listeners;
+}
+
+enum class Read { event, nothing, failed };
+
+Read read_event(const IntDevice *device, iio_event_data *event) {
+  const ssize_t length = read(device->events.get(), event, sizeof *event);
+  if (length == static_cast<ssize_t>(sizeof *event)) {
+    return Read::event;
+  }
+  if (length < 0 && (errno == EAGAIN || errno == EINTR)) {
+    return Read::nothing;
+  }
+  if (length >= 0) {
+    errno = length == 0 ? ENODEV : EIO;
+  }
+  return Read::failed;
+}
+
+// The ports of that channel, on whatever device, their events disabled.
+std::vector<IntListener> disable_channel(int channel) {
+  std::vector<IntListener> listeners;
+  for (const auto &watched : watched_ports) {
+    if (std::cmp_equal(watched.listener.channel, channel)) {
+      watched.listener.disable(watched.listener.port);
+      listeners.push_back(watched.listener);
+    }
+  }
+  return listeners;
+}
+
+// What to call for a wake-up, and whom. The watch ends with a device that can't be read, for it
+// would wake the main loop without end.
+using Call = void (*IntListener::*)(IOPort *port);
+
+Call take_event(IntDevice *device, GIOCondition condition, std::vector<IntListener> *listeners) {
+  const std::lock_guard lock(devices_lock);
+  iio_event_data event{};
+  Read result = Read::failed;
+  if ((condition & G_IO_IN) != 0) {
+    result = read_event(device, &event);
+  } else {
+    errno = ENODEV;
+  }
+  if (result == Read::failed) {
+    log_critical("read Error: %s", g_strerror(errno));
+    *listeners = retire(device);
+    return &IntListener::lost;
+  }
+  if (result == Read::event) {
+    *listeners = disable_channel(IIO_EVENT_CODE_EXTRACT_CHAN(event.id));
+  }
+  return &IntListener::handle;
+}
+
+gboolean on_event(gint /*fd*/, GIOCondition condition, gpointer user_data) {
+  std::vector<IntListener> listeners;
+  const Call call = take_event(static_cast<IntDevice *>(user_data), condition, &listeners);
+  for (const auto &listener : listeners) {
+    (listener.*call)(listener.port);
+  }
+  return G_SOURCE_CONTINUE;
+}
+
+}  // namespace
+
+IntDevicePtr int_device_get(const std::string &path) {
+  const std::lock_guard lock(devices_lock);
+  IntDevicePtr device = find_device(path);
+  if (device) {
+    return device;
+  }
+  UniqueFd events = open_events(path);
+  if (!events) {
+    return nullptr;
+  }
+  device = std::make_shared<IntDevice>();
+  device->path = path;
+  device->events = std::move(events);
+  devices.push_back(device);
+  return device;
+}
+
+void int_device_watch(const IntDevicePtr &device, const IntListener &listener) {
+  const std::lock_guard lock(devices_lock);
+  if (find_watched(listener.port) == watched_ports.end()) {
+    watched_ports.push_back({listener, device.get()});
+    ++device->users;
+  }
+  if (!device->watch && device->events) {
+    device->watch = Source(g_unix_fd_add(device->events.get(), G_IO_IN, on_event, device.get()));
+  }
+}
+
+void int_device_unwatch(const IntDevicePtr &device, const IOPort *port) {
+  const std::lock_guard lock(devices_lock);
+  const auto watched = find_watched(port);
+  if (watched == watched_ports.end()) {
+    return;
+  }
+  watched_ports.erase(watched);
+  if (device->users > 0) {
+    --device->users;
+  }
+  if (device->users == 0) {
+    device->watch.reset();
+  }
+}

@@ -1,0 +1,43 @@
+// The event descriptors of converters that raise threshold events. The kernel gives out one for
+// each device, so the ports on a device share it.
+//
+// The list of devices and of watched ports has a lock of its own, which is never held while a port
+// is called. Main thread.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <string>
+
+#include "base/source.h"
+#include "base/unique-fd.h"
+#include "port/ioport.h"
+
+struct IntDevice {
+  std::string path;  // of the character device
+  UniqueFd events;   // none once the device has failed
+  Source watch;      // of the events, while a port is watched
+  unsigned int users = 0;
+};
+// Held by every port that is set up on the device; the last one to go closes the descriptor.
+using IntDevicePtr = std::shared_ptr<IntDevice>;
+
+// The device that the ports on that path share, opened for the first of them. None, with a message,
+// when it can't be had.
+IntDevicePtr int_device_get(const std::string &path);
+
+// What a port on a device is told.
+struct IntListener {
+  IOPort *port;
+  std::uint32_t channel;
+  // Its channel has an event: no further ones, please. Called under the lock.
+  void (*disable)(IOPort *port);
+  // After that, once for each event.
+  void (*handle)(IOPort *port);
+  // The device has failed, and the port is no longer watched.
+  void (*lost)(IOPort *port);
+};
+
+// Watches the device for the port. Again: nothing, but for a device whose watch has ended.
+void int_device_watch(const IntDevicePtr &device, const IntListener &listener);
+void int_device_unwatch(const IntDevicePtr &device, const IOPort *port);

@@ -1,0 +1,194 @@
+"""Supervised inputs whose line is sampled into a buffer. The character device is a FIFO."""
+
+import struct
+from typing import Iterator
+
+import pytest
+
+from converters import (
+    Converters,
+    processor_time,
+    range_element,
+    readout,
+    start,
+    supervise,
+    supervised,
+    supervised_port,
+    wait_readout,
+)
+from gpio_tree import GpioTree
+from harness import Device, wait_for
+
+NODE = "iio:device2"
+RANGES = range_element("closed", 100, 200) + range_element("cut", 3000, 4000)
+DEVICE = '<device name="buffer" adc="adc" hrtimer="pulse" freq="50" channel="3"/>'
+LOST = ("read Error: ", "Readout failed: ")
+
+
+@pytest.fixture
+def tree(tmp_path) -> Iterator[GpioTree]:
+    tree = GpioTree(tmp_path)
+    yield tree
+    tree.close()
+
+
+@pytest.fixture
+def device(make_device, tree) -> Device:
+    return make_device(binds={"/sys": tree.sys})
+
+
+@pytest.fixture
+def converters(device, tree, tmp_path) -> Iterator[Converters]:
+    converters = Converters(device, tree, tmp_path)
+    make_buffer(converters)
+    converters.attribute("iio:device5", "name", "adc\n")
+    converters.attribute("iio:device5", "trigger/current_trigger", "\n")
+    converters.attribute("trigger0", "name", "pulse\n")
+    converters.attribute("trigger0", "sampling_frequency", "")
+    (tree.sys / "kernel/config/iio/triggers/hrtimer").mkdir(parents=True)
+    yield converters
+    converters.close()
+
+
+def make_buffer(converters: Converters) -> None:
+    converters.attribute(NODE, "name", "buffer\n")
+    converters.attribute(NODE, "scan_elements/in_voltage3_en", "")
+    converters.attribute(NODE, "buffer/enable", "")
+    set_type(converters, "le:u12/16>>0")
+    converters.fifo(NODE)
+
+
+def set_type(converters: Converters, text: str) -> None:
+    converters.attribute(NODE, "scan_elements/in_voltage3_type", f"{text}\n")
+
+
+def iio(elements: str = RANGES, **options) -> str:
+    return supervised_port("iio", DEVICE + elements, **options)
+
+
+def sample(converters: Converters, level: int) -> None:
+    converters.send(NODE, struct.pack("<H", level))
+
+
+def test_sets_up_timer_trigger_and_buffer(device, converters, tree):
+    start(device, iio())
+    assert (tree.sys / "kernel/config/iio/triggers/hrtimer/pulse").is_dir()
+    assert converters.read("trigger0", "sampling_frequency") == "50"
+    assert converters.read("iio:device5", "trigger/current_trigger") == "pulse"
+    assert converters.read(NODE, "scan_elements/in_voltage3_en") == "1"
+    assert converters.read(NODE, "buffer/enable") == "1"
+    assert readout(device) == ("undefined", 0)
+
+
+def test_samples_are_followed_while_supervised(device, converters):
+    start(device, iio())
+    assert converters.control_pins() == "10"
+    with device.signals() as signals:
+        supervise(device)
+        assert converters.control_pins() == "01"
+        sample(converters, 150)
+        signals.wait(lambda change: change.state)
+        wait_readout(device, "closed", 150)
+        sample(converters, 3500)
+        wait_readout(device, "cut", 3500)
+        sample(converters, 9)
+        wait_readout(device, "undefined", 9)
+
+
+@pytest.mark.parametrize(
+    "text, data, level",
+    [
+        ("be:u12/16>>4", b"\xab\xcd", 0xABC),
+        ("le:u10/16>>0", b"\xff\x03", 0x3FF),
+        ("le:u8/8>>0", b"\xa5", 0xA5),
+        ("be:u24/24>>8", b"\x12\x34\x56", 0x1234),
+        ("le:u16/32>>16", b"\x00\x00\x34\x12", 0x1234),
+    ],
+)
+def test_samples_are_taken_apart_by_their_type(device, converters, text, data, level):
+    set_type(converters, text)
+    start(device, iio())
+    supervise(device)
+    converters.send(NODE, data)
+    wait_for(lambda: readout(device)[1] == level, "the level")
+
+
+@pytest.mark.parametrize("text", ["le:s12/16>>4", "le:u40/32>>0", "le:u12/64>>0", "le:u12/12>>0"])
+def test_a_converter_of_another_kind_ends_the_daemon(device, converters, text):
+    set_type(converters, text)
+    with pytest.raises(RuntimeError, match="backend->iio_type"):
+        start(device, iio())
+
+
+@pytest.mark.parametrize("text", ["", "garbage", "le:u12", "le:u12/16", "le:u12/0>>0"])
+def test_a_type_that_cannot_be_read_leaves_the_port_out(device, converters, text):
+    device.allow_critical("Failed to find device type")
+    device.allow_critical("Failed to setup iio device.")
+    set_type(converters, text)
+    start(device, iio())
+    assert readout(device) == ("undefined", 0)
+    supervise(device)
+    sample(converters, 150)
+    assert readout(device) == ("undefined", 0)
+
+
+def test_a_lost_device_reads_undefined_without_a_busy_loop_and_comes_back(device, converters):
+    for text in LOST:
+        device.allow_critical(text)
+    start(device, iio())
+    supervise(device)
+    sample(converters, 150)
+    wait_readout(device, "closed", 150)
+    with device.signals() as signals:
+        used = processor_time(device)
+        converters.hang_up(NODE)
+        wait_readout(device, "undefined", 150)
+        signals.wait()
+        make_buffer(converters)
+        # The daemon looks for it once a second, and has to do nothing else until then.
+        wait_for(lambda: converters.read(NODE, "buffer/enable") == "1", "the device to be found")
+        assert processor_time(device) - used < 0.5
+        signals.take()
+        sample(converters, 160)
+        wait_readout(device, "closed", 160)
+        signals.wait(lambda change: change.state)
+    assert device.log_count("read Error: ") == 1
+
+
+def test_a_short_sample_reads_undefined_and_the_next_one_counts(device, converters):
+    for text in LOST:
+        device.allow_critical(text)
+    start(device, iio())
+    supervise(device)
+    converters.send(NODE, b"x")
+    device.wait_log("Readout failed: Input/output error")
+    sample(converters, 150)
+    wait_readout(device, "closed", 150)
+
+
+def test_a_dropped_port_holds_nothing_and_comes_back_fifty_times(device, converters):
+    start(device, iio(optional=True))
+    supervised(device, "SetSupervisedRanges", "usuu", 0, "short", 5, 6)
+    supervise(device)
+    files = converters.open_files()
+    descriptors = len(device.descriptors())
+    for level in range(100, 150):
+        device.call("DropIOPorts", "as", ["line0"])
+        assert converters.open_files() == []
+        device.call("RefreshIOPorts")
+        sample(converters, level)
+        wait_readout(device, "closed", level)
+    assert converters.open_files() == files
+    assert len(device.descriptors()) == descriptors
+    assert ("short", 5, 6) in supervised(device, "GetSupervisedRanges", "u", 0)
+
+
+def test_supervision_and_ranges_outlive_a_restart(device, converters):
+    start(device, iio())
+    supervised(device, "SetSupervisedRanges", "usuu", 0, "short", 5, 6)
+    supervise(device)
+    device.restart()
+    wait_for(lambda: device.bus.has_owner("com.kelv.IOSupervised.Supervised"), "the interface")
+    assert converters.control_pins() == "01"
+    sample(converters, 5)
+    wait_readout(device, "short", 5)

@@ -1,0 +1,164 @@
+"""Supervised inputs whose line is measured through an SPI converter."""
+
+from typing import Iterator
+
+import pytest
+
+from converters import (
+    OUTPUT,
+    Converters,
+    expect_supervised_error,
+    range_element,
+    readout,
+    start,
+    supervise,
+    supervised,
+    supervised_port,
+    wait_readout,
+)
+from gpio_tree import GpioTree
+from harness import Device, wait_for
+
+RANGES = (
+    range_element("closed", 0x100, 0x1FF)
+    + range_element("open", 0x200, 0x2FF)
+    + range_element("cut", 0xA00, 0xFFF)
+)
+LOST = ("Error: ", "Readout failed: ")
+
+
+@pytest.fixture
+def tree(tmp_path) -> Iterator[GpioTree]:
+    tree = GpioTree(tmp_path)
+    yield tree
+    tree.close()
+
+
+@pytest.fixture
+def device(make_device, tree) -> Device:
+    return make_device(binds={"/sys": tree.sys})
+
+
+@pytest.fixture
+def converters(device, tree, tmp_path) -> Iterator[Converters]:
+    converters = Converters(device, tree, tmp_path)
+    converters.spidev()
+    converters.answer(0)
+    yield converters
+    converters.close()
+
+
+def spi(elements: str = RANGES, **options) -> str:
+    device = '<device path="/run/converters/spidev0"/><address value="1f"/>'
+    return supervised_port("spi", f"{device}{elements}", **options)
+
+
+def test_a_readout_sends_the_address_and_reads_twelve_bits(device, converters):
+    start(device, spi())
+    converters.answer(0xABC)
+    assert readout(device) == ("cut", 0xABC)
+    assert converters.spi_calls() == ["bits 8", "message 1f 00, 2"]
+
+
+def test_the_speed_is_set_when_given(device, converters):
+    start(device, spi('<speed value="0x1000"/>'))
+    assert converters.spi_calls() == ["bits 8", "speed 4096"]
+
+
+def test_changes_of_the_line_are_signalled(device, converters):
+    start(device, spi())
+    converters.answer(0x150)
+    with device.signals() as signals:
+        supervise(device)
+        signals.wait(lambda change: change.state)
+        signals.take()
+        converters.answer(0x250)
+        assert signals.wait().state is False
+        converters.answer(0xA00)
+        signals.wait(lambda change: change.state)
+
+
+def test_the_control_pins_follow_supervision_and_direction(device, converters):
+    start(device, spi(kind="io_ctrl"))
+    assert converters.control_pins() == "10"
+    supervise(device)
+    assert converters.control_pins() == "01"
+    device.call("SetDirection", "us", 0, "output")
+    assert converters.control_pins() == "00"
+    supervise(device, False)
+    assert converters.control_pins() == "10"
+    assert device.call("GetDirection", "u", 0) == "input"
+
+
+def test_switching_an_output_to_supervision_makes_it_an_input(device, converters, tree):
+    start(device, spi(kind="io_ctrl"))
+    device.call("SetDirection", "us", 0, "output")
+    device.call("SetState", "ub", 0, True)
+    assert tree.read(OUTPUT, "value")[0] == "1"
+    supervise(device)
+    assert device.call("GetDirection", "u", 0) == "input"
+    assert tree.read(OUTPUT, "value")[0] == "0"
+    assert converters.control_pins() == "01"
+
+
+def test_a_stored_supervision_is_watched_from_the_start(device, converters):
+    converters.answer(0x150)
+    device.settings(
+        "[line0]\ninput_name=Door\ninput_activelow=false\n"
+        "supervised_input_ranges=[('closed', uint32 256, uint32 511)]\nsupervised_input=true\n"
+    )
+    start(device, spi())
+    assert converters.control_pins() == "01"
+    wait_for(lambda: len(converters.spi_calls()) > 1, "the watch")
+    assert supervised(device, "GetSupervised", "u", 0) is True
+
+
+def test_one_failed_transfer_costs_the_device_until_it_is_refreshed(device, converters):
+    for text in LOST:
+        device.allow_critical(text)
+    start(device, spi(optional=True))
+    converters.answer(0x150)
+    supervise(device)
+    wait_readout(device, "closed", 0x150)
+    converters.fail(5)
+    device.wait_log("Readout failed: Input/output error")
+    converters.answer(0x150)
+    expect_supervised_error(
+        device, "Error.Generic", "Bad file descriptor", "GetSupervisedReadout", "u", 0
+    )
+    device.wait_log("Readout failed: Bad file descriptor", 2)
+    assert device.call("DropIOPorts", "as", ["line0"]) == ["line0"]
+    device.call("RefreshIOPorts")
+    wait_readout(device, "closed", 0x150)
+
+
+def test_a_missing_device_parks_an_optional_port_until_it_is_there(device, converters):
+    device.allow_critical("Failed to open")
+    node = converters.folder / "spidev0"
+    node.unlink()
+    start(device, spi(optional=True))
+    assert device.port_props() == []
+    converters.spidev()
+    converters.answer(0x150)
+    device.call("RefreshIOPorts")
+    assert readout(device) == ("closed", 0x150)
+
+
+def test_a_dropped_port_keeps_one_descriptor_and_comes_back_fifty_times(device, converters):
+    start(device, spi(optional=True))
+    supervised(device, "SetSupervisedRanges", "usuu", 0, "short", 0x10, 0x20)
+    supervise(device)
+    files = converters.open_files()
+    descriptors = len(device.descriptors())
+    for level in range(0x100, 0x132):
+        device.call("DropIOPorts", "as", ["line0"])
+        assert converters.open_files() == ["/run/converters/spidev0"]
+        device.call("RefreshIOPorts")
+        converters.answer(level)
+        assert readout(device) == ("closed", level)
+        assert converters.control_pins() == "01"
+    assert converters.open_files() == files
+    assert len(device.descriptors()) == descriptors
+    assert ("short", 0x10, 0x20) in supervised(device, "GetSupervisedRanges", "u", 0)
+    reads = len(converters.spi_calls())
+    wait_for(lambda: len(converters.spi_calls()) > reads, "the watch")
