@@ -84,10 +84,12 @@ extern "C" guint g_timeout_add(guint interval, GSourceFunc function, gpointer da
 }
 
 // GPIO lines are read and driven with these two.
+// NOLINTNEXTLINE(readability-inconsistent-declaration-parameter-name): the library's are reserved.
 extern "C" ssize_t pread64(int fd, void *buffer, size_t size, off64_t offset) {
   return is_broken(fd) ? -1 : syscall(SYS_pread64, fd, buffer, size, offset);
 }
 
+// NOLINTNEXTLINE(readability-inconsistent-declaration-parameter-name)
 extern "C" ssize_t pwrite64(int fd, const void *buffer, size_t size, off64_t offset) {
   return is_broken(fd) ? -1 : syscall(SYS_pwrite64, fd, buffer, size, offset);
 }
@@ -222,10 +224,9 @@ void Bench::iterate() {
 
 std::vector<guint> Bench::timers() {
   forget_dead_timers();
-  std::vector<guint> intervals;
-  for (const auto &timer : all_timers) {
-    intervals.push_back(timer.interval);
-  }
+  std::vector<guint> intervals(all_timers.size());
+  std::transform(all_timers.begin(), all_timers.end(), intervals.begin(),
+                 [](const Timer &timer) { return timer.interval; });
   return intervals;
 }
 
