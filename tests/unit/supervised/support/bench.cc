@@ -1,7 +1,6 @@
 #include "support/bench.h"
 
 #include <dlfcn.h>
-#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -36,6 +35,12 @@ bool is_broken(int fd) {
   const auto file = std::filesystem::read_symlink("/proc/self/fd/" + std::to_string(fd), error);
   errno = EIO;
   return std::find(broken_files.begin(), broken_files.end(), file.string()) != broken_files.end();
+}
+
+// How the kernel takes a 64-bit offset depends on the machine; the C library knows.
+template <typename Function>
+Function *real_call(const char *name) {
+  return reinterpret_cast<Function *>(dlsym(RTLD_NEXT, name));
 }
 
 bool armed(const Timer &timer) {
@@ -86,12 +91,14 @@ extern "C" guint g_timeout_add(guint interval, GSourceFunc function, gpointer da
 // GPIO lines are read and driven with these two.
 // NOLINTNEXTLINE(readability-inconsistent-declaration-parameter-name): the library's are reserved.
 extern "C" ssize_t pread64(int fd, void *buffer, size_t size, off64_t offset) {
-  return is_broken(fd) ? -1 : syscall(SYS_pread64, fd, buffer, size, offset);
+  static const auto real = real_call<ssize_t(int, void *, size_t, off64_t)>("pread64");
+  return is_broken(fd) ? -1 : real(fd, buffer, size, offset);
 }
 
 // NOLINTNEXTLINE(readability-inconsistent-declaration-parameter-name)
 extern "C" ssize_t pwrite64(int fd, const void *buffer, size_t size, off64_t offset) {
-  return is_broken(fd) ? -1 : syscall(SYS_pwrite64, fd, buffer, size, offset);
+  static const auto real = real_call<ssize_t(int, const void *, size_t, off64_t)>("pwrite64");
+  return is_broken(fd) ? -1 : real(fd, buffer, size, offset);
 }
 
 // Attributes of the kernel are read with this.
