@@ -11,10 +11,15 @@ from typing import Optional
 sys.path.insert(0, str(Path(__file__).resolve().parent.parent / "tests/service"))
 
 from gi.repository import GLib  # noqa: E402
-from harness import Device, PortChanged, PortProps, become_root, wait_for  # noqa: E402
+from harness import DBusError, Device, PortChanged, PortProps, become_root, wait_for  # noqa: E402
+from neighbours import IoBox, Neighbourhood, Streamer  # noqa: E402
 
 DOOR, MOTION, MODULE = "/run/demo/door", "/run/demo/motion", "/run/demo/module"
-RELAY, CONFIGURABLE, ALARM = 3, 4, 5
+PLUG = "/run/demo/plug"
+RELAY, CONFIGURABLE, ALARM, BOX, TRIGGER = 3, 4, 5, 8, 21
+
+EVENT_PATH, EVENT_INTERFACE = "/com/kelv/Event/pcd", "com.kelv.Event.Producer"
+CONNECTOR, CONNECTOR_PATH = "com.kelv.PCD.Connector", "/com/kelv/PCD/Connector"
 
 Names = dict[int, tuple[str, str]]  # by port number: as an input, as an output
 
@@ -22,15 +27,18 @@ Names = dict[int, tuple[str, str]]  # by port number: as an input, as an output
 class Life:
     """The simulated device: inputs that move by themselves, and a client that switches outputs."""
 
-    def __init__(self, device: Device):
+    def __init__(self, device: Device, neighbourhood: Neighbourhood):
         self._device = device
+        self._neighbourhood = neighbourhood
         self._tick = 0
-        self._states = {DOOR: False, RELAY: False, ALARM: False}
+        self._states = {DOOR: False, RELAY: False, ALARM: False, BOX: False, TRIGGER: False}
 
     def prepare(self) -> None:
         self._device.conf((Path(__file__).parent / "conf.xml").read_text())
-        for attribute in (DOOR, MOTION):
-            self._device.write(attribute, "0\n").chmod(0o666)
+        for attribute, value in ((DOOR, 0), (MOTION, 0), (PLUG, 1)):
+            self._device.write(attribute, f"{value}\n").chmod(0o666)
+        self._box = IoBox(self._neighbourhood, self._device)
+        Streamer(self._neighbourhood, self._device, {1: True, 2: True})
 
     def tick(self) -> bool:
         """One second of the device's life."""
@@ -43,6 +51,10 @@ class Life:
             self._device.write(MOTION, "1\n")
         if self._tick % 7 == 0:
             self._client("SetVirtual", "ub", ALARM, self._toggle(ALARM))
+        if self._tick % 5 == 1:
+            self._box.report(BOX, "closed" if self._toggle(BOX) else "open")
+        if self._tick % 5 == 3:
+            self._client("SetVirtual", "ub", TRIGGER, self._toggle(TRIGGER))
         if self._tick == 6:
             self._plug_in()
         if self._tick % 9 == 0:
@@ -77,20 +89,35 @@ def shown_name(names: Names, number: int, is_input: bool) -> str:
     return names[number][0 if is_input else 1]
 
 
+def names_of(device: Device, number: int, identifier: str = "") -> tuple[str, str]:
+    """A port that is not one of the device's own, such as a manual trigger, has only its identifier."""
+    try:
+        return device.call("GetNames", "u", number)
+    except DBusError:
+        return identifier, identifier
+
+
+def connector_states(device: Device) -> list[int]:
+    arguments = ("GetConnectorStates", "s", "video connector")
+    return device.bus.call(CONNECTOR, CONNECTOR_PATH, CONNECTOR, *arguments)
+
+
 def print_table(device: Device) -> Names:
     """Prints the ports that are in service, and gives their names by number."""
     ports = sorted(device.port_props(), key=lambda port: port.number)
-    names = {port.number: device.call("GetNames", "u", port.number) for port in ports}
+    names = {port.number: names_of(device, port.number, port.id) for port in ports}
     inputs, outputs = device.call("GetNbrPorts")
     print(f"{len(ports)} ports in service, {inputs} inputs and {outputs} outputs\n")
-    row = "{:>2}  {:<14}{:<26}{:<22}{:<10}{}"
+    row = "{:>2}  {:<16}{:<26}{:<22}{:<10}{}"
     print(row.format("No", "Identifier", "Name", "Role", "State", "Flags"))
     for port in ports:
         name = shown_name(names, port.number, port.input)
         state = "active" if port.state else "inactive"
         flags = " ".join(sorted(flag for flag, value in port.flags.items() if value))
         print(row.format(port.number, port.id, name, role(port), state, flags))
-    print(flush=True)
+    states = connector_states(device)
+    plugged = sum(states)
+    print(f"\n{len(states)} video connector, {plugged} of them plugged in\n", flush=True)
     return names
 
 
@@ -103,12 +130,20 @@ def print_change(change: PortChanged, names: Names, elapsed: float) -> None:
     print(f"{elapsed:6.1f}s  {line}", flush=True)
 
 
-def watch(device: Device, seconds: Optional[float]) -> None:
-    """Shows every change until the time is up or somebody interrupts."""
-    life = Life(device)
+def print_event(sent: tuple, elapsed: float) -> None:
+    number, keys = sent
+    shown = ", ".join(f"{key} {value}" for key, value in keys.items() if key[:5] != "topic")
+    print(f"{elapsed:6.1f}s  event {number}: {shown}", flush=True)
+
+
+def watch(device: Device, neighbourhood: Neighbourhood, seconds: Optional[float]) -> None:
+    """Shows every change and every event until the time is up or somebody interrupts."""
+    life = Life(device, neighbourhood)
     life.prepare()
     device.start()
-    with device.signals() as signals:
+    wait_for(lambda: all(connector_states(device)), "the first look at the connector")
+    events = device.signals("Sent", interface=EVENT_INTERFACE, path=EVENT_PATH)
+    with device.signals() as signals, events:
         names = print_table(device)
         begin = time.monotonic()
         ticker = GLib.timeout_add_seconds(1, life.tick)
@@ -117,8 +152,10 @@ def watch(device: Device, seconds: Optional[float]) -> None:
             for change in signals.take():
                 if change.port not in names:
                     # It came back into service after the table was printed.
-                    names[change.port] = device.call("GetNames", "u", change.port)
+                    names[change.port] = names_of(device, change.port)
                 print_change(change, names, time.monotonic() - begin)
+            for sent in events.take():
+                print_event(sent, time.monotonic() - begin)
             time_is_up = seconds is not None and time.monotonic() - begin >= seconds
             return time_is_up or not device.running
 
@@ -141,11 +178,13 @@ def main() -> int:
     become_root()
     with tempfile.TemporaryDirectory(prefix="portd-demo-") as folder:
         device = Device(Path(folder), arguments.binary)
+        neighbourhood = Neighbourhood()
         try:
-            watch(device, arguments.seconds)
+            watch(device, neighbourhood, arguments.seconds)
         except KeyboardInterrupt:
             print()
         finally:
+            neighbourhood.close()
             problems = device.close()
     for problem in problems:
         print(problem, file=sys.stderr)

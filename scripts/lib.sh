@@ -5,12 +5,12 @@ repo=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd)
 build=$repo/build
 python=/usr/bin/python3
 
-run_packages=(dbus python3 python3-gi util-linux)
+run_packages=(dbus python3 python3-dbusmock python3-gi util-linux)
 build_packages=(gcc g++ meson ninja-build pkg-config libglib2.0-dev libglib2.0-dev-bin libgpiod-dev)
 test_packages=(
   clang-14 clang-format-14 clang-tidy-14 clang-tools-14 libclang-rt-14-dev llvm-14
   libgtest-dev libgmock-dev libumockdev-dev libxml2-utils strace umockdev
-  python3-dbusmock python3-pytest gir1.2-umockdev-1.0
+  python3-pytest gir1.2-umockdev-1.0
 )
 
 step() { printf '\n=== %s\n' "$*"; }

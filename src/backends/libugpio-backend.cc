@@ -48,12 +48,16 @@ gboolean recheck_line(gpointer user_data);
 // Reading acknowledges the edge, also when it is a client's question that happens to come before
 // the watch. The change must be reported all the same.
 void note_level(IOPort *port, GpioBackendData *data, int level) {
+  const bool watch_missed_it = data->watch && !data->settling;
   data->unreadable = level < 0;
   if (data->unreadable) {
+    if (watch_missed_it && !data->recheck) {
+      data->recheck = Source(g_timeout_add(kRetryInterval, recheck_line, port));
+    }
     return;
   }
   const int old = std::exchange(data->seen, level != 0 ? 1 : 0);
-  if (data->watch && !data->settling && old != kNotSeen && old != data->seen) {
+  if (watch_missed_it && old != kNotSeen && old != data->seen) {
     data->recheck = Source(g_idle_add_full(G_PRIORITY_DEFAULT, recheck_line, port, nullptr));
   }
 }
@@ -78,17 +82,20 @@ std::uint32_t get_state(IOPort *port) {
   return level != 0 ? 1 : 0;
 }
 
+int write_line(GpioBackendData *data, const GpioPinPtr &pin, int level) {
+  const std::lock_guard guard(data->lock);
+  return libugpio_write_gpio_pin(pin.get(), level);
+}
+
 void set_state(IOPort *port, std::int32_t level) {
   GpioBackendData *data = data_of(port);
-  const std::lock_guard guard(data->lock);
-  if (libugpio_write_gpio_pin(data->output.get(), level) == -1) {
+  if (write_line(data, data->output, level) == -1) {
     log_warning("Failed to set state on port!\n");
   }
 }
 
 void switch_io_ctrl(GpioBackendData *data, int value) {
-  const std::lock_guard guard(data->lock);
-  if (libugpio_write_gpio_pin(data->io_ctrl.get(), value) == -1) {
+  if (write_line(data, data->io_ctrl, value) == -1) {
     log_warning("Couldn't change direction on port!\n");
   }
 }
@@ -102,9 +109,10 @@ void stop_watch(GpioBackendData *data) {
   data->seen = kNotSeen;
 }
 
-bool still_signals(int fd) {
+bool still_signals_unreadable(GpioBackendData *data, int fd) {
+  const std::lock_guard guard(data->lock);
   pollfd line{.fd = fd, .events = POLLPRI, .revents = 0};
-  return poll(&line, 1, 0) > 0;
+  return data->unreadable && poll(&line, 1, 0) > 0;
 }
 
 void begin_settling(GpioBackendData *data) {
@@ -157,11 +165,9 @@ gboolean line_signals(gint fd, GIOCondition condition, gpointer user_data) {
   if ((condition & (G_IO_HUP | G_IO_NVAL)) != 0) {
     log_warning("Port %s: the line is gone and no longer watched", io_port_describe(port));
     stop_watch(data);
-    return G_SOURCE_REMOVE;
-  }
-  const std::lock_guard guard(data->lock);
-  if (data->unreadable && still_signals(fd)) {
+  } else if (still_signals_unreadable(data, fd)) {
     log_warning("Port %s: the line can't be read", io_port_describe(port));
+    const std::lock_guard guard(data->lock);
     data->watch.reset();  // until a recheck succeeds
   }
   return G_SOURCE_CONTINUE;

@@ -41,7 +41,9 @@ bool setup(IOPort *port, bool /*initial_level*/) {
     log_warning("Port %s: a sysfs port can only be an input", io_port_describe(port));
     return false;
   }
-  data->fd.reset(open(data->path.c_str(), (data->clear_flag ? O_RDWR : O_RDONLY) | O_CLOEXEC));
+  // A path that names a pipe, by mistake, must not hold the start until somebody writes to it.
+  const int mode = data->clear_flag ? O_RDWR : O_RDONLY;
+  data->fd.reset(open(data->path.c_str(), mode | O_NONBLOCK | O_CLOEXEC));
   if (!data->fd && !io_port_is_optional(port)) {
     log_warning("Failed to open %s: %s", data->path.c_str(), g_strerror(errno));
   }

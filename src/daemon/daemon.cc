@@ -177,6 +177,7 @@ int daemon_run(int argc, char **argv) {
   daemon.loop.reset(g_main_loop_new(nullptr, FALSE));
   install_signal_sources(daemon);
   if (!bring_up_ports()) {
+    port_registry_drop_all();
     return 1;
   }
   drop_privileges();

@@ -10,6 +10,7 @@
 #include "supervised/supervised-data.h"
 
 inline constexpr std::int32_t kNoLimit = -1;
+inline constexpr std::uint32_t kDefaultLimitTimeout = 1000;
 
 struct IioIntSupervisedData : SupervisedData {
   // --- From the hardware description ---
@@ -21,7 +22,7 @@ struct IioIntSupervisedData : SupervisedData {
   // Levels that thresholds can't lie beyond. There the level is read again after limit_timeout.
   std::int32_t lower_limit = kNoLimit;
   std::int32_t upper_limit = kNoLimit;
-  std::uint32_t limit_timeout = 1000;  // milliseconds
+  std::uint32_t limit_timeout = kDefaultLimitTimeout;  // milliseconds
   // In microseconds. The kernel takes it in seconds: its sysfs documentation of industrial I/O says
   // so for in_<type>_integration_time ("integration time in seconds"), and its drivers parse the
   // text as seconds with six decimals.

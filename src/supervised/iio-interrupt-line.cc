@@ -158,8 +158,10 @@ bool connect(IOPort *port) {
 gboolean read_again(gpointer user_data);
 gboolean recover(gpointer user_data);
 
+// A document that asks for no pause at all would keep the main loop from sleeping.
 void read_later(IOPort *port, IioIntSupervisedData *data) {
-  data->limit_timer = Source(g_timeout_add(data->limit_timeout, read_again, port));
+  const guint pause = data->limit_timeout != 0 ? data->limit_timeout : kDefaultLimitTimeout;
+  data->limit_timer = Source(g_timeout_add(pause, read_again, port));
 }
 
 void look_for_device(IOPort *port, IioIntSupervisedData *data) {
@@ -176,17 +178,29 @@ bool get_ranges(IOPort *port, const IioIntSupervisedData &data, SupervisedRanges
   return io_port_get_supervised_ranges(port, ranges);
 }
 
+bool holds(const SupervisedRange &range, std::int32_t value) {
+  const auto level = static_cast<std::uint32_t>(value);
+  return range.lower <= level && level <= range.upper;
+}
+
 // The last range that holds the level, or none.
-const SupervisedRange *find_range(const SupervisedRanges &ranges, std::uint32_t level) {
-  const auto found = std::find_if(ranges.rbegin(), ranges.rend(), [&](const auto &range) {
-    return range.lower <= level && level <= range.upper;
-  });
+const SupervisedRange *find_range(const SupervisedRanges &ranges, std::int32_t value) {
+  const auto found = std::find_if(ranges.rbegin(), ranges.rend(),
+                                  [&](const auto &range) { return holds(range, value); });
   return found == ranges.rend() ? nullptr : &*found;
 }
 
 bool at_limit(const IioIntSupervisedData &data, std::int32_t value) {
   return (data.lower_limit != kNoLimit && value <= data.lower_limit) ||
          (data.upper_limit != kNoLimit && value >= data.upper_limit);
+}
+
+// A level that has moved on while its thresholds were set crosses none of them any more, and a
+// state that was new only to the thresholds is one that nobody was told.
+bool must_look_again(IioIntSupervisedData *data, const SupervisedRange &range) {
+  const bool untold =
+      data->last_state != SUPERVISED_STATE_UNDEFINED && data->last_state != range.state;
+  return untold || !read_value(data, nullptr) || !holds(range, data->value);
 }
 
 // Where no threshold can be set the level is read again after a while: it would be the last one
@@ -199,13 +213,16 @@ void arm(IOPort *port) {
     look_for_device(port, data);
     return;
   }
-  const SupervisedRange *range = find_range(ranges, static_cast<std::uint32_t>(data->value.load()));
+  const SupervisedRange *range = find_range(ranges, data->value);
   if (!range || at_limit(*data, data->value)) {
     read_later(port, data);
     return;
   }
   data->limit_timer.reset();
   apply_thresholds(&data->files, plan_thresholds(*range, data->rules));
+  if (must_look_again(data, *range)) {
+    read_later(port, data);
+  }
 }
 
 // What the line is now; undefined, with an error, when it can't be read.
@@ -331,4 +348,12 @@ void iio_int_set_threshold_watch(IOPort *port, bool on) {
   }
   watch_events(port, *data);
   arm(port);
+}
+
+void iio_int_ranges_changed(IOPort *port) {
+  const IioIntSupervisedData *data = iio_int_data(port);
+  if (data->initialised && !data->lost && io_port_supervised_input(port)) {
+    disable(port);
+    arm(port);
+  }
 }

@@ -17,3 +17,5 @@ bool iio_int_readout(IOPort *port, bool fresh, SupervisedRangeState *state, std:
 // Sets the thresholds around the range that the level is in now, and reports every change of the
 // state from then on; or no longer. On again: the thresholds are set anew.
 void iio_int_set_threshold_watch(IOPort *port, bool on);
+// The port has other ranges: thresholds that are set lie around one that may be gone.
+void iio_int_ranges_changed(IOPort *port);

@@ -42,7 +42,7 @@ UniqueFd get_event_descriptor(const UniqueFd &node) {
   int fd = -1;
   if (ioctl(node.get(), IIO_GET_EVENT_FD_IOCTL, &fd) < 0 || fd < 0) {
     log_critical("Failed to open device: %s", g_strerror(errno));
-    return UniqueFd();
+    return {};
   }
   UniqueFd events(fd);
   Error error;
@@ -56,7 +56,7 @@ UniqueFd open_events(const std::string &path) {
   const UniqueFd node(open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
   if (!node) {
     log_critical("Failed to open device %s: %s", path.c_str(), g_strerror(errno));
-    return UniqueFd();
+    return {};
   }
   return get_event_descriptor(node);
 }

@@ -45,6 +45,14 @@ bool set_supervised(IOPort *port, bool supervised) {
   return supervised_switch(port, supervised, supervised || iio_int_data(port)->adc_mode, kParts);
 }
 
+bool set_supervised_ranges(IOPort *port, SupervisedRanges ranges, GError **error) {
+  if (!supervised_ranges_set(port, std::move(ranges), error)) {
+    return false;
+  }
+  iio_int_ranges_changed(port);
+  return true;
+}
+
 bool get_supervised_readout(IOPort *port, SupervisedRangeState *state, std::uint32_t *level,
                             GError **error) {
   const IioIntSupervisedData *data = iio_int_data(port);
@@ -98,7 +106,7 @@ constexpr PortFunctions kFunctions = {
     .is_supervisable = is_supervisable,
     .set_supervised = set_supervised,
     .get_supervised_ranges = supervised_ranges_get,
-    .set_supervised_ranges = supervised_ranges_set,
+    .set_supervised_ranges = set_supervised_ranges,
     .get_supervised_readout = get_supervised_readout,
     .get_state = get_state,
     .set_state = supervised_set_state,

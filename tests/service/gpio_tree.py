@@ -26,7 +26,7 @@ class GpioTree:
         self.sys = folder / "sys"
         self.gpio = self.sys / "class/gpio"
         self._unborn = self.sys / "unborn"
-        self.gpio.mkdir(parents=True)
+        self.gpio.mkdir(parents=True, exist_ok=True)
         self._unborn.mkdir()
         self._records: list[str] = []
         self._names: dict[int, str] = {}

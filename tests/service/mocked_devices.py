@@ -1,5 +1,6 @@
 """Device nodes whose ioctls a test answers, through umockdev's preload library."""
 
+import errno
 import struct
 import threading
 import time
@@ -32,9 +33,9 @@ class MockedDevices:
         self._loop = GLib.MainLoop.new(self._context, False)
         self._thread = threading.Thread(target=self._serve, daemon=True)
         self._thread.start()
-        self._root = Path(self.testbed.get_root_dir())
-        self._root.chmod(0o755)  # the daemon comes here after it gave up its privileges, too
-        device.sandbox.bind(_FOLDER, self._root)
+        self.root = Path(self.testbed.get_root_dir())
+        self.root.chmod(0o755)  # the daemon comes here after it gave up its privileges, too
+        device.sandbox.bind(_FOLDER, self.root)
         device.mkdir(_FOLDER)
         self._plain_environment = device._environment
         self._sanitized = device.sanitized
@@ -71,7 +72,7 @@ class MockedDevices:
         self.testbed.add_from_string(description)
         self._in_thread(lambda: self.testbed.attach_ioctl(node, handler))
         for path in (f"ioctl{node}", node.lstrip("/")):
-            (self._root / path).chmod(0o666)
+            (self.root / path).chmod(0o666)
 
     def close(self) -> None:
         self._loop.quit()
@@ -109,9 +110,9 @@ class Spidev(UMockdev.IoctlBase):
             self.bytes, self.errno = answer, 0
         self.wait_messages(1)
 
-    def fail(self, errno: int) -> None:
+    def fail(self, code: int) -> None:
         with self._lock:
-            self.errno = errno
+            self.errno = code
         self.wait_messages(1)
 
     def take(self) -> list[SpiMessage]:
@@ -152,3 +153,53 @@ def add_spidev(devices: MockedDevices, name: str) -> Spidev:
     description = f"P: /devices/spi0/{name}\nN: {name}\nE: DEVNAME=/dev/{name}\nE: SUBSYSTEM=spidev\n"
     devices.add(f"/dev/{name}", description, spidev)
     return spidev
+
+
+_CHIP_INFO, _LINE_INFO = 0x8044B401, 0xC048B402
+_CHIP = struct.Struct("=32s32sI")
+_LINE = struct.Struct("=II32s32s")
+
+
+class GpioChip(UMockdev.IoctlBase):
+    """A chip's character device, as far as finding lines by name needs it."""
+
+    def __init__(self, name: str, label: str, line_names: list[str]):
+        super().__init__()
+        self._info = _CHIP.pack(name.encode(), label.encode(), len(line_names))
+        self._line_names = [line.encode() for line in line_names]
+
+    def do_handle_ioctl(self, client: UMockdev.IoctlClient) -> bool:
+        request = client.get_request() & 0xFFFFFFFF
+        if request == _CHIP_INFO:
+            client.get_arg().resolve(0, _CHIP.size).update(0, self._info)
+        elif request == _LINE_INFO:
+            info = client.get_arg().resolve(0, _LINE.size)
+            offset = _LINE.unpack(info.retrieve())[0]
+            info.update(0, _LINE.pack(offset, 0, self._line_names[offset], b""))
+        known = request in (_CHIP_INFO, _LINE_INFO)
+        client.complete(0 if known else -1, 0 if known else errno.EINVAL)
+        return True
+
+
+def add_gpiochip(
+    devices: MockedDevices, number: int, label: str, line_names: list[str], base: int
+) -> GpioChip:
+    """A chip as character device and, under another number, in sysfs. Both belong to one device."""
+    name, owner = f"gpiochip{number}", f"/devices/platform/{label}"
+    chip = GpioChip(name, label, line_names)
+    devices.add(
+        f"/dev/{name}",
+        f"P: {owner}/{name}\nN: {name}\nE: DEVNAME=/dev/{name}\nE: MAJOR=254\nE: MINOR={number}\n"
+        f"E: SUBSYSTEM=chips\nA: dev=254:{number}\\n\n",
+        chip,
+    )
+    sys = devices.root / "sys"
+    on_bus = sys / "bus/gpio/devices"
+    on_bus.mkdir(parents=True, exist_ok=True)
+    (on_bus / name).symlink_to(f"../../..{owner}/{name}")
+    in_class = sys / f"class/gpio/gpiochip{base}"
+    in_class.mkdir(parents=True)
+    for attribute, text in {"base": base, "label": label, "ngpio": len(line_names)}.items():
+        (in_class / attribute).write_text(f"{text}\n")
+    (in_class / "device").symlink_to(f"../../..{owner}")
+    return chip

@@ -44,10 +44,15 @@ def test_shows_the_table_and_then_the_changes(demo):
     table, _, changes = output.partition("\n\n")[2].partition("\n\n")
     # The optional port's module is plugged in later.
     assert [line.split()[1] for line in table.splitlines()[1:]] == [
-        "door", "pir_detector", "forwarding", "relay", "io1", "alarm", "spare",
+        "door", "pir_detector", "forwarding", "relay", "io1", "alarm", "spare", "box1", "video_out",
+        "manualtrigger1", "manualtrigger2",
     ]  # fmt: skip
+    assert changes.startswith("1 video connector, 1 of them plugged in\n")
     assert re.search(r"^ +\d+\.\ds  port 0 Door contact +input +active$", changes, re.MULTILINE)
     assert re.search(r"^ +\d+\.\ds  port 3 Relay +output +active$", changes, re.MULTILINE)
+    assert re.search(r"^ +\d+\.\ds  port 8 Gate, on the I/O box +input +active$", changes, re.MULTILINE)
+    # The second video channel's manual trigger raises its event.
+    assert re.search(r"^ +\d+\.\ds  event \d+: port 2, state True$", changes, re.MULTILINE)
 
 
 @pytest.mark.parametrize("number", [signal.SIGINT, signal.SIGTERM])

@@ -51,7 +51,7 @@ def converters(device, tree, tmp_path) -> Iterator[Converters]:
 
 
 def set_raw(converters: Converters, level: int, channel: int = 0) -> None:
-    converters.attribute(ENTRY, f"in_voltage{channel}_raw", f"{level}\n")
+    converters.level(ENTRY, f"in_voltage{channel}_raw", level)
 
 
 def armed(converters: Converters, channel: int = 0) -> list[str]:

@@ -34,10 +34,10 @@ EventKey *key_for(EventDeclaration *declaration, const gchar *name) {
 
 gboolean set_value(Inspectable *inspectable, const gchar *name, std::optional<EventValue> value) {
   EventKey *key = value ? key_for(inspectable, name) : nullptr;
-  if (!key || (key->type != kTypeUnknown && key->type != type_of(*value))) {
+  if (!key || (key->type != kTypeUnknown && key->type != value->type)) {
     return FALSE;
   }
-  key->type = type_of(*value);
+  key->type = value->type;
   key->value = std::move(value);
   return TRUE;
 }
@@ -131,15 +131,16 @@ gboolean event_declaration_is_property(const EventDeclaration *declaration) {
 }
 
 gboolean inspectable_set_int(Inspectable *inspectable, const gchar *key, gint32 value) {
-  return set_value(inspectable, key, EventValue(value));
+  return set_value(inspectable, key, EventValue{.type = EVENT_KEY_INT, .integer = value});
 }
 
 gboolean inspectable_set_bool(Inspectable *inspectable, const gchar *key, gboolean value) {
-  return set_value(inspectable, key, EventValue(value != FALSE));
+  return set_value(inspectable, key, EventValue{.type = EVENT_KEY_BOOL, .boolean = value != FALSE});
 }
 
 gboolean inspectable_set_double(Inspectable *inspectable, const gchar *key, gdouble value) {
-  return std::isfinite(value) && set_value(inspectable, key, EventValue(value));
+  return std::isfinite(value) &&
+         set_value(inspectable, key, EventValue{.type = EVENT_KEY_DOUBLE, .real = value});
 }
 
 gboolean inspectable_set_string(Inspectable *inspectable, const gchar *key, const gchar *value) {

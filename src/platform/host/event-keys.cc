@@ -12,15 +12,15 @@ std::optional<EventValue> int_from_text(const gchar *text) {
   if (!g_ascii_string_to_signed(text, 10, G_MININT32, G_MAXINT32, &number, nullptr)) {
     return std::nullopt;
   }
-  return EventValue(static_cast<gint32>(number));
+  return EventValue{.type = EVENT_KEY_INT, .integer = static_cast<gint32>(number)};
 }
 
 std::optional<EventValue> bool_from_text(std::string_view text) {
   if (text == "1" || text == "true") {
-    return EventValue(true);
+    return EventValue{.type = EVENT_KEY_BOOL, .boolean = true};
   }
   if (text == "0" || text == "false") {
-    return EventValue(false);
+    return EventValue{.type = EVENT_KEY_BOOL, .boolean = false};
   }
   return std::nullopt;
 }
@@ -35,7 +35,7 @@ std::optional<EventValue> double_from_text(const gchar *text) {
   if (*end != '\0' || !std::isfinite(number)) {
     return std::nullopt;
   }
-  return EventValue(number);
+  return EventValue{.type = EVENT_KEY_DOUBLE, .real = number};
 }
 
 }  // namespace
@@ -52,10 +52,6 @@ bool is_key_type(gint type) {
   return type >= EVENT_KEY_INT && type <= EVENT_KEY_STRING;
 }
 
-gint type_of(const EventValue &value) {
-  return static_cast<gint>(value.index()) + EVENT_KEY_INT;
-}
-
 std::optional<EventValue> value_from_text(gint type, const gchar *text) {
   if (!is_text(text)) {
     return std::nullopt;
@@ -68,7 +64,7 @@ std::optional<EventValue> value_from_text(gint type, const gchar *text) {
     case EVENT_KEY_DOUBLE:
       return double_from_text(text);
     case EVENT_KEY_STRING:
-      return EventValue(std::string(text));
+      return EventValue{.type = EVENT_KEY_STRING, .text = text};
     default:
       return std::nullopt;
   }
@@ -88,7 +84,7 @@ bool take_values(Inspectable &into, const Inspectable &values) {
   const bool agree =
       std::equal(values.keys.begin(), values.keys.end(), into.keys.begin(), into.keys.end(),
                  [](const EventKey &from, const EventKey &to) {
-                   return !from.value || to.type == kTypeUnknown || to.type == type_of(*from.value);
+                   return !from.value || to.type == kTypeUnknown || to.type == from.value->type;
                  });
   if (!agree) {
     return false;
@@ -96,7 +92,7 @@ bool take_values(Inspectable &into, const Inspectable &values) {
   auto to = into.keys.begin();
   for (const auto &from : values.keys) {
     if (from.value) {
-      to->type = type_of(*from.value);
+      to->type = from.value->type;
       to->value = from.value;
     }
     ++to;

@@ -5,16 +5,21 @@
 
 #include <optional>
 #include <string>
-#include <utility>
-#include <variant>
 #include <vector>
 
 #include "platform/event.h"
 
-// In the order of the type codes.
-using EventValue = std::variant<gint32, bool, double, std::string>;
-
 inline constexpr gint kTypeUnknown = 0;
+
+// A value is what the type says (EVENT_KEY_...); the other members are not looked at. No variant:
+// with a sanitizer on, the compiler sees uninitialised strings in its moves.
+struct EventValue {
+  gint type;
+  gint32 integer = 0;
+  bool boolean = false;
+  double real = 0.0;
+  std::string text = {};
+};
 
 struct NiceNames {
   std::string key;
@@ -52,7 +57,6 @@ bool is_text(const gchar *text);
 bool is_name(const gchar *text);
 
 bool is_key_type(gint type);
-gint type_of(const EventValue &value);
 std::optional<EventValue> value_from_text(gint type, const gchar *text);
 
 // The keys alone, for an event or a property callback to fill in.

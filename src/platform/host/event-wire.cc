@@ -1,36 +1,17 @@
 #include "platform/host/event-wire.h"
 
-#include <type_traits>
-
 namespace {
 
 GVariant *value_to_variant(const EventValue &value) {
-  return std::visit(
-      [](const auto &held) -> GVariant * {
-        using Held = std::decay_t<decltype(held)>;
-        if constexpr (std::is_same_v<Held, gint32>) {
-          return g_variant_new_int32(held);
-        } else if constexpr (std::is_same_v<Held, bool>) {
-          return g_variant_new_boolean(held);
-        } else if constexpr (std::is_same_v<Held, double>) {
-          return g_variant_new_double(held);
-        } else {
-          return g_variant_new_string(held.c_str());
-        }
-      },
-      value);
-}
-
-EventValue zero_of(gint type) {
-  switch (type) {
+  switch (value.type) {
     case EVENT_KEY_BOOL:
-      return false;
+      return g_variant_new_boolean(value.boolean);
     case EVENT_KEY_DOUBLE:
-      return 0.0;
+      return g_variant_new_double(value.real);
     case EVENT_KEY_STRING:
-      return std::string();
+      return g_variant_new_string(value.text.c_str());
     default:
-      return gint32{0};
+      return g_variant_new_int32(value.integer);
   }
 }
 
@@ -66,7 +47,7 @@ GVariant *keys_to_variant(const Inspectable &inspectable) {
   for (const auto &key : inspectable.keys) {
     if (key.type != kTypeUnknown) {
       g_variant_builder_add(&builder, "{sv}", key.name.c_str(),
-                            value_to_variant(key.value.value_or(zero_of(key.type))));
+                            value_to_variant(key.value.value_or(EventValue{.type = key.type})));
     }
   }
   return g_variant_builder_end(&builder);

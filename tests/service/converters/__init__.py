@@ -173,6 +173,11 @@ class Converters:
             path.chmod(0o666)
         return path
 
+    def level(self, entry: str, name: str, level: int) -> None:
+        """In one step: the daemon may read at any time."""
+        fresh = self.attribute(entry, "level.new", f"{level}\n")
+        fresh.rename(self.attribute(entry, name))
+
     def read(self, entry: str, name: str) -> str:
         return self.attribute(entry, name).read_text()
 

@@ -309,9 +309,13 @@ class Device:
             CONTROL, CONTROL_PATH, CONTROL, method, signature, *args, timeout=timeout
         )
 
-    def begin_call(self, method: str, signature: str = "", *args: Any) -> Pending:
+    def begin_call(
+        self, method: str, signature: str = "", *args: Any, timeout: float = 25
+    ) -> Pending:
         """The same without waiting for the reply."""
-        return self.bus.begin_call(CONTROL, CONTROL_PATH, CONTROL, method, signature, *args)
+        return self.bus.begin_call(
+            CONTROL, CONTROL_PATH, CONTROL, method, signature, *args, timeout=timeout
+        )
 
     def wait_name(self, name: str) -> None:
         self.bus.wait_name(name)

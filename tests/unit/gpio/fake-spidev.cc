@@ -1,6 +1,7 @@
 #include "fake-spidev.h"
 
 #include <algorithm>
+#include <bit>
 #include <cerrno>
 
 // The linker's option --wrap gives the call this name.
@@ -9,7 +10,7 @@ int fake_ioctl(int fd, unsigned long request, spi_ioc_transfer *transfers) asm("
 namespace {
 
 std::uint8_t *bytes_of(std::uint64_t address) {
-  return reinterpret_cast<std::uint8_t *>(static_cast<std::uintptr_t>(address));
+  return std::bit_cast<std::uint8_t *>(static_cast<std::uintptr_t>(address));
 }
 
 }  // namespace

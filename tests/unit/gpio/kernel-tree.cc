@@ -15,12 +15,17 @@ namespace fs = std::filesystem;
 // The linker's option --wrap gives the calls and the real functions these names.
 ssize_t fake_write(int fd, const void *data, size_t size) asm("__wrap_write");
 ssize_t real_write(int fd, const void *data, size_t size) asm("__real_write");
+// Large files have calls of their own on some machines.
+ssize_t fake_pread(int fd, void *data, size_t size, off_t offset) asm("__wrap_pread");
+ssize_t fake_pread64(int fd, void *data, size_t size, off64_t offset) asm("__wrap_pread64");
+ssize_t real_pread64(int fd, void *data, size_t size, off64_t offset) asm("__real_pread64");
 void fake_usleep(gulong microseconds) asm("__wrap_g_usleep");
 gint64 fake_monotonic_time() asm("__wrap_g_get_monotonic_time");
 
 namespace {
 
 constexpr const char *kClass = "class/gpio/";
+constexpr gint64 kStart = 1000 * G_TIME_SPAN_SECOND;
 
 KernelTree *current = nullptr;
 
@@ -28,7 +33,7 @@ KernelTree *current = nullptr;
 std::string tree_file(int fd) {
   std::error_code error;
   const std::string path = fs::read_symlink("/proc/self/fd/" + std::to_string(fd), error).string();
-  const std::string base = ugpio_host_root() + "/" + kClass;
+  const std::string base = (fs::path(ugpio_host_root()) / kClass).string();
   return path.starts_with(base) ? path.substr(base.size()) : "";
 }
 
@@ -54,7 +59,7 @@ KernelTree::~KernelTree() {
 
 void KernelTree::make_line(const std::string &number) {
   for (const auto &[name, text] : attributes) {
-    write_file(kClass + ("gpio" + number) + "/" + name, text);
+    write_file((fs::path(kClass) / ("gpio" + number) / name).string(), text);
   }
 }
 
@@ -101,7 +106,7 @@ int KernelTree::on_write(const std::string &file, const std::string &text) {
 
 ssize_t fake_write(int fd, const void *data, size_t size) {
   const std::string file = current ? tree_file(fd) : "";
-  if (!file.empty()) {
+  if (current && !file.empty()) {
     if (const int error =
             current->on_write(file, std::string(static_cast<const char *>(data), size))) {
       errno = error;
@@ -109,6 +114,17 @@ ssize_t fake_write(int fd, const void *data, size_t size) {
     }
   }
   return real_write(fd, data, size);
+}
+
+ssize_t fake_pread64(int fd, void *data, size_t size, off64_t offset) {
+  if (current) {
+    ++current->reads;
+  }
+  return real_pread64(fd, data, size, offset);
+}
+
+ssize_t fake_pread(int fd, void *data, size_t size, off_t offset) {
+  return fake_pread64(fd, data, size, offset);
 }
 
 void fake_usleep(gulong microseconds) {
@@ -119,6 +135,5 @@ void fake_usleep(gulong microseconds) {
 }
 
 gint64 fake_monotonic_time() {
-  constexpr gint64 kStart = 1000 * G_TIME_SPAN_SECOND;
   return kStart + (current ? current->slept : 0);
 }

@@ -23,6 +23,7 @@ class KernelTree {
   std::vector<std::string> writes;    // "gpio12/direction high", "export 12", in order
   std::function<void()> on_export;    // called for every write to `export`, before anything else
   std::function<void()> on_sleep;     // called for every sleep of the library
+  int reads = 0;                      // of open files at a position
   long slept = 0;                     // microseconds
 
   void make_line(const std::string &number);

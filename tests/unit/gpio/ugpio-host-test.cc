@@ -1,72 +1,8 @@
-#include "platform/host/ugpio-host.h"
-
 #include <fcntl.h>
-#include <gtest/gtest.h>
-#include <poll.h>
-#include <ugpio/ugpio.h>
-#include <unistd.h>
 
-#include <cerrno>
-#include <memory>
-
-#include "base/glib-ptr.h"
-#include "kernel-tree.h"
-#include "log-capture.h"
+#include "ugpio-fixture.h"
 
 namespace {
-
-using Writes = std::vector<std::string>;
-using ContextPtr = std::unique_ptr<ugpio_t, GlibDeleter<ugpio_free>>;
-
-constexpr unsigned int kInput = 0x14D;
-constexpr unsigned int kOutputHigh = 0x42;
-constexpr unsigned int kOutputLow = 0x40;
-constexpr uid_t kNobody = 65534;
-
-std::optional<UgpioHostLine> named_line;
-
-class UgpioHostTest : public testing::Test {
- protected:
-  UgpioHostTest() { named_line.reset(); }
-
-  static ContextPtr request(unsigned int flags) {
-    return ContextPtr(ugpio_request_one(12, flags, "pin"));
-  }
-  static ContextPtr open(unsigned int flags) {
-    ContextPtr context = request(flags);
-    EXPECT_EQ(ugpio_full_open(context.get()), 0);
-    return context;
-  }
-  std::string line_file(const char *name) const {
-    return tree.read_file(std::string("class/gpio/gpio12/") + name);
-  }
-  void set_line_file(const char *name, const char *text) const {
-    tree.write_file(std::string("class/gpio/gpio12/") + name, text);
-  }
-
-  LogCapture log;
-  KernelTree tree;
-};
-
-// Takes root's rights away for a while; for other users there is nothing to take away.
-class Unprivileged {
- public:
-  Unprivileged() {
-    if (was_root_) {
-      EXPECT_EQ(seteuid(kNobody), 0);
-    }
-  }
-  Unprivileged(const Unprivileged &) = delete;
-  Unprivileged &operator=(const Unprivileged &) = delete;
-  ~Unprivileged() {
-    if (was_root_) {
-      EXPECT_EQ(seteuid(0), 0);
-    }
-  }
-
- private:
-  bool was_root_ = geteuid() == 0;
-};
 
 // --- Requests ---
 
@@ -226,25 +162,20 @@ TEST_F(UgpioHostTest, TheFilesOfAFreshLineAreWaitedFor) {
 }
 
 TEST_F(UgpioHostTest, TheRightsToAFreshLineAreWaitedFor) {
-  if (geteuid() == 0) {
-    tree.exports = false;
-    tree.set_mode("class/gpio/export", 0666);
-    tree.on_sleep = [this] {
-      const uid_t user = geteuid();
-      ASSERT_EQ(seteuid(0), 0);
-      if (tree.slept == 1'000) {
-        tree.make_line("12");
-      } else if (tree.slept == 20'000) {
-        for (const auto &[name, text] : tree.attributes) {
-          tree.set_mode("class/gpio/gpio12/" + name, 0666);
-        }
-      }
-      ASSERT_EQ(seteuid(user), 0);
-    };
-    const Unprivileged nobody;
-    EXPECT_TRUE(request(kInput));
-    EXPECT_EQ(tree.slept, 20'000);
-  }
+  tree.exports = false;
+  tree.set_mode("class/gpio/export", 0666);
+  tree.on_sleep = [this] {
+    const Privileged owner;
+    if (tree.slept == 1'000) {
+      tree.make_line("12");
+      set_line_modes(0);
+    } else if (tree.slept == 20'000) {
+      set_line_modes(0666);
+    }
+  };
+  const Unprivileged nobody;
+  EXPECT_TRUE(request(kInput));
+  EXPECT_EQ(tree.slept, 20'000);
 }
 
 TEST_F(UgpioHostTest, ALineThatNeverAppearsIsNotWaitedForLong) {
@@ -271,6 +202,12 @@ TEST_F(UgpioHostTest, TheValueIsReadFromTheStartEveryTime) {
   set_line_file("value", "1\n");
   EXPECT_EQ(ugpio_get_value(context.get()), 1);
   EXPECT_EQ(ugpio_get_value(context.get()), 1);
+}
+
+// The kernel signals on every descriptor that was never read.
+TEST_F(UgpioHostTest, AnOpenedLineHasBeenReadSoThatItSignalsOnlyEdges) {
+  const ContextPtr context = open(kInput);
+  EXPECT_EQ(tree.reads, 1);
 }
 
 TEST_F(UgpioHostTest, AValueThatIsNoLevelCannotBeRead) {
@@ -315,15 +252,13 @@ TEST_F(UgpioHostTest, AnInputCannotBeDriven) {
 }
 
 TEST_F(UgpioHostTest, AValueThatMayOnlyBeReadIsOpenedForReading) {
-  if (geteuid() == 0) {
-    tree.make_line("12");
-    tree.set_mode("class/gpio/gpio12/value", 0444);
-    const ContextPtr context = request(kOutputLow);
-    const Unprivileged nobody;
-    EXPECT_EQ(ugpio_full_open(context.get()), 0);
-    EXPECT_EQ(ugpio_get_value(context.get()), 0);
-    EXPECT_EQ(ugpio_set_value(context.get(), 1), -1);
-  }
+  tree.make_line("12");
+  tree.set_mode("class/gpio/gpio12/value", 0444);
+  const ContextPtr context = request(kOutputLow);
+  const Unprivileged nobody;
+  EXPECT_EQ(ugpio_full_open(context.get()), 0);
+  EXPECT_EQ(ugpio_get_value(context.get()), 0);
+  EXPECT_EQ(ugpio_set_value(context.get(), 1), -1);
 }
 
 TEST_F(UgpioHostTest, TheDescriptorIsTheValueFiles) {
@@ -363,95 +298,4 @@ TEST_F(UgpioHostTest, NoContextFailsInEveryCallAndNeverCrashes) {
   ugpio_free(nullptr);
 }
 
-// --- Names ---
-
-class UgpioNamesTest : public UgpioHostTest {
- protected:
-  void make_chip(const char *class_name, const char *device, const char *base, const char *label,
-                 const char *lines) const {
-    const std::string chip = std::string("class/gpio/") + class_name;
-    tree.write_file(chip + "/base", std::string(base) + "\n");
-    tree.write_file(chip + "/label", std::string(label) + "\n");
-    tree.write_file(chip + "/ngpio", std::string(lines) + "\n");
-    tree.make_link(chip + "/device", device);
-  }
-  void make_character_device(const char *name, const char *directory) const {
-    tree.write_file(std::string(directory) + "/dev", "254:0\n");
-    tree.make_link(std::string("bus/gpio/devices/") + name, directory);
-  }
-  // Two chips, whose character devices are numbered the other way round than in sysfs.
-  void make_two_chips() const {
-    make_character_device("gpiochip0", "devices/soc/gpiochip0");
-    make_character_device("gpiochip1", "devices/expander/gpiochip1");
-    make_chip("gpiochip512", "devices/soc", "512", "soc", "32");
-    make_chip("gpiochip480", "devices/expander", "480", "expander", "16");
-  }
-};
-
-TEST_F(UgpioNamesTest, ANamedLineIsTheNumberOfItsChipPlusItsOffset) {
-  make_two_chips();
-  named_line = {.chip = "gpiochip1", .label = "expander", .lines = 16, .offset = 3};
-  const ContextPtr context(ugpio_request_one_named("siren", kOutputHigh));
-  ASSERT_TRUE(context);
-  EXPECT_EQ(tree.writes, (Writes{"export 483", "gpio483/direction high"}));
-}
-
-TEST_F(UgpioNamesTest, ANamedLineCanBeRequestedWithoutFlags) {
-  make_two_chips();
-  named_line = {.chip = "gpiochip0", .label = "soc", .lines = 32, .offset = 0};
-  const ContextPtr context(ugpio_request_named("sioctrl"));
-  ASSERT_TRUE(context);
-  EXPECT_EQ(tree.writes, Writes{"export 512"});
-}
-
-TEST_F(UgpioNamesTest, AnUnknownNameGivesNoEntry) {
-  EXPECT_FALSE(ContextPtr(ugpio_request_one_named("siren", kInput)));
-  EXPECT_EQ(errno, ENOENT);
-  EXPECT_FALSE(ContextPtr(ugpio_request_named("siren")));
-  EXPECT_EQ(errno, ENOENT);
-}
-
-TEST_F(UgpioNamesTest, NoNameIsInvalid) {
-  EXPECT_FALSE(ContextPtr(ugpio_request_one_named(nullptr, kInput)));
-  EXPECT_EQ(errno, EINVAL);
-  EXPECT_FALSE(ContextPtr(ugpio_request_named(nullptr)));
-}
-
-TEST_F(UgpioNamesTest, ChipsOfOneDeviceAreToldApartByTheirLabels) {
-  make_character_device("gpiochip0", "devices/soc/gpiochip0");
-  make_chip("gpiochip512", "devices/soc", "512", "bank-a", "32");
-  make_chip("gpiochip480", "devices/soc", "480", "bank-b", "32");
-  EXPECT_EQ(ugpio_host_line_number({"gpiochip0", "bank-b", 32, 1}), 481U);
-}
-
-TEST_F(UgpioNamesTest, ChipsThatCannotBeToldApartAreNotGuessed) {
-  make_character_device("gpiochip0", "devices/soc/gpiochip0");
-  make_chip("gpiochip512", "devices/soc", "512", "bank", "32");
-  make_chip("gpiochip480", "devices/soc", "480", "bank", "32");
-  EXPECT_FALSE(ugpio_host_line_number({"gpiochip0", "bank", 32, 1}));
-  EXPECT_EQ(errno, ENOTUNIQ);
-}
-
-TEST_F(UgpioNamesTest, AChipWithoutADeviceOfItsOwnIsItsOwnDevice) {
-  make_character_device("gpiochip0", "devices/gpiochip0");
-  make_chip("gpiochip100", "devices/gpiochip0", "100", "lone", "8");
-  EXPECT_EQ(ugpio_host_line_number({"gpiochip0", "lone", 8, 7}), 107U);
-}
-
-TEST_F(UgpioNamesTest, AChipThatSysfsDoesNotHaveGivesNoDevice) {
-  make_character_device("gpiochip0", "devices/soc/gpiochip0");
-  make_chip("gpiochip480", "devices/expander", "480", "soc", "32");
-  EXPECT_FALSE(ugpio_host_line_number({"gpiochip0", "soc", 32, 1}));
-  EXPECT_EQ(errno, ENODEV);
-  EXPECT_FALSE(ugpio_host_line_number({"gpiochip7", "soc", 32, 1}));
-  EXPECT_EQ(errno, ENODEV);
-}
-
 }  // namespace
-
-std::optional<UgpioHostLine> ugpio_host_find_line(const char * /*name*/) {
-  if (!named_line) {
-    errno = ENOENT;
-  }
-  return named_line;
-}

@@ -8,7 +8,7 @@
 
 namespace {
 
-using std::string_view_literals::operator""sv;
+using namespace std::string_view_literals;
 
 class PropertiesTest : public LegacyTest {
  protected:

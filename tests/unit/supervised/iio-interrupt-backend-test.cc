@@ -278,6 +278,65 @@ TEST_F(Interrupt, ALevelInNoRangeArmsNothingAndIsReadAgain) {
   EXPECT_EQ(reports(), (Words{"1 on"}));
 }
 
+TEST_F(Interrupt, ADocumentThatAsksForNoPauseGetsTheUsualOne) {
+  set_raw(50);
+  const IOPortRef port = watched({{"device", "limit_timeout", "0"}});
+  EXPECT_EQ(timers(), (std::vector<guint>{kLimit}));
+}
+
+TEST_F(Interrupt, NewRangesMoveTheThresholds) {
+  const IOPortRef port = watched();
+  EXPECT_TRUE(io_port_set_supervised_range(port.get(), "closed", 140, 160, nullptr));
+  EXPECT_EQ(armed(), "160/140, enabled 1/1");
+  EXPECT_EQ(reports(), Words{});
+}
+
+TEST_F(Interrupt, AStateThatNewRangesBringIsReported) {
+  const IOPortRef port = watched();
+  send_events(0);
+  reports();
+  EXPECT_TRUE(io_port_set_supervised_range(port.get(), "open", 140, 300, nullptr));
+  EXPECT_EQ(armed(), "300/140, enabled 1/1");
+  expire(kLimit);
+  EXPECT_EQ(reports(), (Words{"1 off"}));
+  EXPECT_EQ(timers(), std::vector<guint>{});
+}
+
+TEST_F(Interrupt, NewRangesOfAPortThatIsNotWatchedArmNothing) {
+  const IOPortRef port = make();
+  EXPECT_TRUE(io_port_setup(port.get()));
+  EXPECT_TRUE(io_port_set_supervised_range(port.get(), "closed", 140, 160, nullptr));
+  EXPECT_EQ(armed(), "1/0, enabled 0/0");
+}
+
+TEST_F(Interrupt, ALevelThatMovesBeforeItsThresholdsAreSetIsReported) {
+  const IOPortRef port = watched();
+  send_events(0);
+  reports();
+  set_raw(250);
+  texts_to_come({"150\n", "250\n"});
+  send_events(0);
+  EXPECT_EQ(reports(), Words{});
+  EXPECT_EQ(timers(), (std::vector<guint>{kLimit}));
+  expire(kLimit);
+  EXPECT_EQ(reports(), (Words{"1 off"}));
+  EXPECT_EQ(timers(), std::vector<guint>{});
+}
+
+TEST_F(Interrupt, ALevelThatMovesWhileItsThresholdsAreSetIsReported) {
+  const IOPortRef port = watched();
+  send_events(0);
+  reports();
+  set_raw(250);
+  texts_to_come({"150\n", "150\n", "250\n"});
+  send_events(0);
+  EXPECT_EQ(reports(), Words{});
+  EXPECT_EQ(timers(), (std::vector<guint>{kLimit}));
+  expire(kLimit);
+  EXPECT_EQ(reports(), (Words{"1 off"}));
+  EXPECT_EQ(timers(), std::vector<guint>{});
+}
+
 TEST_F(Interrupt, SwitchedOffNothingIsReadAnyMore) {
   set_raw(50);
   const IOPortRef port = watched();

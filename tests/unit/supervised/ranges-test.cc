@@ -10,8 +10,6 @@
 
 namespace {
 
-using testing::Test;
-
 constexpr guint kPoll = 250;
 
 using Words = std::vector<std::string>;

@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <deque>
 #include <filesystem>
 #include <fstream>
 #include <mutex>
@@ -27,6 +28,7 @@ std::vector<Timer> all_timers;
 std::vector<std::string> all_reports;
 std::vector<std::string> all_logged;
 std::vector<std::string> broken_files;
+std::deque<std::string> coming_texts;
 
 bool is_broken(int fd) {
   std::error_code error;
@@ -87,14 +89,29 @@ extern "C" guint g_timeout_add(guint interval, GSourceFunc function, gpointer da
 }
 
 // GPIO lines are read and driven with these two.
+// NOLINTNEXTLINE(readability-inconsistent-declaration-parameter-name): the library's are reserved.
 extern "C" ssize_t pread64(int fd, void *buffer, size_t size, off64_t offset) {
   static const auto real = real_call<ssize_t(int, void *, size_t, off64_t)>("pread64");
   return is_broken(fd) ? -1 : real(fd, buffer, size, offset);
 }
 
+// NOLINTNEXTLINE(readability-inconsistent-declaration-parameter-name)
 extern "C" ssize_t pwrite64(int fd, const void *buffer, size_t size, off64_t offset) {
   static const auto real = real_call<ssize_t(int, const void *, size_t, off64_t)>("pwrite64");
   return is_broken(fd) ? -1 : real(fd, buffer, size, offset);
+}
+
+// Attributes of the kernel are read with this.
+extern "C" gboolean g_file_get_contents(const gchar *filename, gchar **contents, gsize *length,
+                                        GError **error) {
+  static const auto real =
+      reinterpret_cast<decltype(&g_file_get_contents)>(dlsym(RTLD_NEXT, "g_file_get_contents"));
+  if (coming_texts.empty()) {
+    return real(filename, contents, length, error);
+  }
+  *contents = g_strdup(coming_texts.front().c_str());
+  coming_texts.pop_front();
+  return TRUE;
 }
 
 extern "C" void g_usleep(gulong /*microseconds*/) {}
@@ -107,6 +124,7 @@ Bench::Bench() {
   g_log_set_default_handler(on_log, nullptr);
   all_reports.clear();
   all_logged.clear();
+  coming_texts.clear();
   port_listener() = {};
   port_listener().port_changed = on_port_changed;
   port_listener().send_event = on_send_event;
@@ -143,6 +161,10 @@ void Bench::remove(std::string_view name) const {
 void Bench::block(std::string_view name) const {
   remove(name);
   std::filesystem::create_directories(path(name));
+}
+
+void Bench::texts_to_come(const std::vector<std::string> &texts) {
+  coming_texts.assign(texts.begin(), texts.end());
 }
 
 void Bench::make_line(int number) const {
@@ -209,10 +231,9 @@ void Bench::iterate() {
 
 std::vector<guint> Bench::timers() {
   forget_dead_timers();
-  std::vector<guint> intervals;
-  for (const auto &timer : all_timers) {
-    intervals.push_back(timer.interval);
-  }
+  std::vector<guint> intervals(all_timers.size());
+  std::transform(all_timers.begin(), all_timers.end(), intervals.begin(),
+                 [](const Timer &timer) { return timer.interval; });
   return intervals;
 }
 

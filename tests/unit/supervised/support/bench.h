@@ -27,8 +27,6 @@ class Bench : public testing::Test {
  protected:
   Bench();
   ~Bench() override;
-  Bench(const Bench &) = delete;
-  Bench &operator=(const Bench &) = delete;
 
   // --- Files, all below the bench's folder ---
   std::string path(std::string_view name) const { return root_ + "/" + std::string(name); }
@@ -38,6 +36,9 @@ class Bench : public testing::Test {
   void remove(std::string_view name) const;
   // Puts a directory where the file is, which nothing can write then, or takes it away again.
   void block(std::string_view name) const;
+
+  // What the next reads of whole files give, whatever the files hold.
+  static void texts_to_come(const std::vector<std::string> &texts);
 
   // --- GPIO lines ---
   void make_line(int number) const;

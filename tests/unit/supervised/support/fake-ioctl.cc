@@ -23,6 +23,7 @@ int finish(int error, const std::string &call) {
 
 template <typename T>
 T *pointer(std::uint64_t address) {
+  // NOLINTNEXTLINE(performance-no-int-to-ptr): the kernel takes pointers as numbers.
   return reinterpret_cast<T *>(static_cast<std::uintptr_t>(address));
 }
 

@@ -7,8 +7,6 @@ class IioBench : public Bench {
  protected:
   IioBench();
   ~IioBench() override;
-  IioBench(const IioBench &) = delete;
-  IioBench &operator=(const IioBench &) = delete;
 
   // A device's attribute files, as the kernel would have them.
   void make_device(int number, const char *name) const;

@@ -1,0 +1,74 @@
+"""Lines that the hardware description calls by name, which the kernel's GPIO devices know."""
+
+from typing import Iterator
+
+import pytest
+
+from gpio_tree import GpioTree
+from harness import hwdesc, port
+from mocked_devices import MockedDevices, add_gpiochip
+
+OUTPUT_WRITES = ("direction low", "active_low 0")
+
+
+def output(attributes: str) -> str:
+    backend = f'<backend name="gpio"><output {attributes}/></backend>'
+    return port("terminal", 0, "output", backend=None, extra=backend)
+
+
+@pytest.fixture
+def devices(device) -> Iterator[MockedDevices]:
+    """A device with two chips, which sysfs numbers the other way round."""
+    devices = MockedDevices(device)
+    add_gpiochip(devices, 0, "soc", ["led", ""], 512)
+    add_gpiochip(devices, 1, "expander", ["", "relay", "siren"], 480)
+    yield devices
+    devices.close()
+
+
+@pytest.fixture
+def tree(devices) -> Iterator[GpioTree]:
+    tree = GpioTree(devices.root)
+    yield tree
+    tree.close()
+
+
+@pytest.mark.parametrize("name, number", [("led", 512), ("relay", 481), ("siren", 482)])
+def test_a_name_is_the_line_of_its_chip(device, tree, name, number):
+    tree.line(number)
+    device.conf(hwdesc(output(f'alias="{name}"')))
+    device.start()
+    tree.wait(*(f"gpio{number}/{text}" for text in OUTPUT_WRITES))
+    device.call("SetState", "ub", 0, True)
+    tree.wait(f"gpio{number}/value 1")
+
+
+def test_a_fresh_line_is_exported_by_its_number(device, tree):
+    tree.line(482, exported=False)
+    device.conf(hwdesc(output('alias="siren"')))
+    device.start()
+    tree.wait("export 482", *(f"gpio482/{text}" for text in OUTPUT_WRITES))
+
+
+def test_the_name_counts_where_there_is_a_number_too(device, tree):
+    tree.line(7)
+    tree.line(482)
+    device.conf(hwdesc(output('pin="7" alias="siren"')))
+    device.start()
+    tree.wait(*(f"gpio482/{text}" for text in OUTPUT_WRITES))
+
+
+def test_a_name_that_no_chip_has(device, tree):
+    device.conf(hwdesc(output('alias="bell"')))
+    device.start()
+    assert device.log_count("Failed to allocate pin 0/bell") == 1
+    assert tree.take() == []
+    assert device.call("GetState", "u", 0) is True
+
+
+def test_a_chip_that_is_out_of_order_hides_no_line_of_others(device, devices, tree):
+    (devices.root / "sys/devices/platform/soc/gpiochip0/dev").unlink()
+    tree.line(482)
+    device.conf(hwdesc(output('alias="siren"')))
+    device.start()
+    tree.wait(*(f"gpio482/{text}" for text in OUTPUT_WRITES))
