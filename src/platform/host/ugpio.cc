@@ -72,6 +72,12 @@ std::string line_path(const ugpio_t &context) {
   return class_path("gpio" + std::to_string(context.number));
 }
 
+// Callers say which line failed; only here it is known why.
+void explain(const std::string &action, const std::string &path) {
+  const ErrnoKeeper keeper;
+  log_warning("Can't %s %s: %s", action.c_str(), path.c_str(), g_strerror(errno));
+}
+
 UniqueFd open_file(const std::string &path, int flags) {
   return UniqueFd(uninterrupted([&] { return open(path.c_str(), flags | O_CLOEXEC); }));
 }
@@ -106,6 +112,14 @@ bool write_attribute(const ugpio_t &context, const char *name, std::string_view 
   return write_text(open_attribute(context, name, O_WRONLY | O_TRUNC), text);
 }
 
+bool write_or_explain(const ugpio_t &context, const char *name, std::string_view text) {
+  const bool written = write_attribute(context, name, text);
+  if (!written) {
+    explain("write", line_path(context) + "/" + name);
+  }
+  return written;
+}
+
 bool write_number(const char *file, unsigned int number) {
   return write_text(open_file(class_path(file), O_WRONLY | O_TRUNC), std::to_string(number));
 }
@@ -127,16 +141,23 @@ bool export_line(ugpio_t &context) {
     return true;
   }
   // Busy may also mean that another process exported the line since we looked.
-  const ErrnoKeeper keeper;
-  return errno == EBUSY && is_exported(context);
+  const int reason = errno;
+  if (reason == EBUSY && is_exported(context)) {
+    return true;
+  }
+  errno = reason;
+  explain("export GPIO " + std::to_string(context.number) + " with", class_path("export"));
+  return false;
 }
 
 struct GiveBack {
   void operator()(ugpio_t *context) const {
     const ErrnoKeeper keeper;
     context->value.reset();
-    if (context->exported) {
-      (void)write_number("unexport", context->number);
+    // EINVAL: the line went away with its chip.
+    if (context->exported && !write_number("unexport", context->number) && errno != EINVAL) {
+      explain("give GPIO " + std::to_string(context->number) + " back with",
+              class_path("unexport"));
     }
     delete context;
   }
@@ -169,6 +190,7 @@ bool set_edges(const ugpio_t &context, unsigned int flags) {
     return true;
   }
   if (errno != ENOENT) {
+    explain("write", line_path(context) + "/edge");
     return false;
   }
   log_warning("GPIO %u can't signal edges: its changes go unseen", context.number);
@@ -178,12 +200,12 @@ bool set_edges(const ugpio_t &context, unsigned int flags) {
 // Edges that an earlier user left on would keep the line from becoming an output.
 bool clear_edges(const ugpio_t &context) {
   const auto edges = ugpio_host_read_file(line_path(context) + "/edge");
-  return !edges || edges->empty() || edges == "none" || write_attribute(context, "edge", "none");
+  return !edges || edges->empty() || edges == "none" || write_or_explain(context, "edge", "none");
 }
 
 bool make_input(ugpio_t &context, unsigned int flags) {
   context.input = true;
-  if (!write_attribute(context, "direction", "in")) {
+  if (!write_or_explain(context, "direction", "in")) {
     return false;
   }
   const bool triggers = (flags & (UGPIOF_TRIG_FALL | UGPIOF_TRIG_RISE)) != 0;
@@ -192,7 +214,7 @@ bool make_input(ugpio_t &context, unsigned int flags) {
 
 bool make_output(const ugpio_t &context, unsigned int flags) {
   const bool high = (flags & UGPIOF_INIT_HIGH) != 0;
-  return clear_edges(context) && write_attribute(context, "direction", high ? "high" : "low");
+  return clear_edges(context) && write_or_explain(context, "direction", high ? "high" : "low");
 }
 
 bool configure(ugpio_t &context, unsigned int flags) {
@@ -283,6 +305,7 @@ int ugpio_full_open(ugpio_t *context) {
   }
   context->value = open_value(*context);
   if (!context->value) {
+    explain("open", line_path(*context) + "/value");
     return -1;
   }
   // A fresh descriptor signals an edge until its first read, whether there was one or not.
@@ -294,7 +317,7 @@ int ugpio_set_activelow(ugpio_t *context, int activelow) {
   if (!context) {
     return fail(EINVAL);
   }
-  return write_attribute(*context, "active_low", activelow != 0 ? "1" : "0") ? 0 : -1;
+  return write_or_explain(*context, "active_low", activelow != 0 ? "1" : "0") ? 0 : -1;
 }
 
 int ugpio_get_value(ugpio_t *context) {
