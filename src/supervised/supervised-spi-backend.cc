@@ -54,9 +54,10 @@ bool spi_set_control_pins(IOPort *port) {
 // --- Set-up ---
 
 bool open_device(SpiSupervisedData *data) {
-  data->fd.reset(open(data->path.c_str(), O_RDWR | O_CLOEXEC));
   left_open().erase(data->path);
+  data->fd.reset(open(data->path.c_str(), O_RDWR | O_CLOEXEC));
   if (!data->fd) {
+    log_warning("Can't open %s: %s", data->path.c_str(), g_strerror(errno));
     log_critical("Failed to open SPI device.");
     return false;
   }
