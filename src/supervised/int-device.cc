@@ -17,6 +17,8 @@
 
 namespace {
 
+constexpr guint kCheckInterval = 1;  // seconds
+
 struct Watched {
   IntListener listener;
   const IntDevice *device;
@@ -77,6 +79,7 @@ std::vector<IntListener> retire(IntDevice *device) {
   });
   device->users = 0;
   device->watch.reset();
+  device->check.reset();
   device->events.reset();
   return listeners;
 }
@@ -142,6 +145,11 @@ gboolean on_event(gint /*fd*/, GIOCondition condition, gpointer user_data) {
   return G_SOURCE_CONTINUE;
 }
 
+// The kernel wakes nobody for a device that is gone, and no event would ever come again.
+gboolean check_device(gpointer user_data) {
+  return on_event(-1, G_IO_IN, user_data);
+}
+
 }  // namespace
 
 IntDevicePtr int_device_get(const std::string &path) {
@@ -169,6 +177,7 @@ void int_device_watch(const IntDevicePtr &device, const IntListener &listener) {
   }
   if (!device->watch && device->events) {
     device->watch = Source(g_unix_fd_add(device->events.get(), G_IO_IN, on_event, device.get()));
+    device->check = Source(g_timeout_add_seconds(kCheckInterval, check_device, device.get()));
   }
 }
 
@@ -184,5 +193,6 @@ void int_device_unwatch(const IntDevicePtr &device, const IOPort *port) {
   }
   if (device->users == 0) {
     device->watch.reset();
+    device->check.reset();
   }
 }

@@ -17,6 +17,7 @@ struct IntDevice {
   std::string path;  // of the character device
   UniqueFd events;   // none once the device has failed
   Source watch;      // of the events, while a port is watched
+  Source check;      // whether the device is still there, at the same time
   unsigned int users = 0;
 };
 // Held by every port that is set up on the device; the last one to go closes the descriptor.

@@ -26,6 +26,7 @@ namespace {
 constexpr const char *kTimerTriggers = "/sys/kernel/config/iio/triggers/hrtimer/";
 constexpr int kFolderMode = 0775;
 constexpr guint kRecoveryInterval = 1000;  // milliseconds between two looks for a lost device
+constexpr guint kCheckInterval = 1;        // seconds between two looks whether it is lost
 constexpr int kDecimal = 10;
 
 struct IioSupervisedData : SupervisedData {
@@ -42,6 +43,7 @@ struct IioSupervisedData : SupervisedData {
   std::uint32_t last_level = 0;
   bool lost = false;  // the device failed; until its first sample after that
   Source device_watch;
+  Source device_check;
   Source recovery;
 };
 
@@ -213,6 +215,7 @@ gboolean recover(gpointer user_data);
 void lose_device(IOPort *port, IioSupervisedData *data) {
   data->lost = true;
   data->device_watch.reset();
+  data->device_check.reset();
   data->fd.reset();
   data->recovery = Source(g_timeout_add(kRecoveryInterval, recover, port));
 }
@@ -240,8 +243,14 @@ gboolean on_sample(gint /*fd*/, GIOCondition condition, gpointer user_data) {
   return G_SOURCE_CONTINUE;
 }
 
+// The kernel wakes nobody for a device that is gone, and its last sample would stand for ever.
+gboolean check_device(gpointer user_data) {
+  return on_sample(-1, G_IO_IN, user_data);
+}
+
 void watch_device(IOPort *port, IioSupervisedData *data) {
   data->recovery.reset();
+  data->device_check = Source(g_timeout_add_seconds(kCheckInterval, check_device, port));
   data->device_watch = Source(g_unix_fd_add(data->fd.get(), G_IO_IN, on_sample, port));
 }
 
@@ -259,6 +268,7 @@ void set_device_watch(IOPort *port, bool on) {
   IioSupervisedData *data = data_of(port);
   if (!on) {
     data->device_watch.reset();
+    data->device_check.reset();
     data->recovery.reset();
   } else if (!data->device_watch && !data->recovery) {
     data->last_state = SUPERVISED_STATE_UNDEFINED;
