@@ -82,7 +82,7 @@ class Privileges : public SupervisedTest {
                         true) +
            port_element("interrupt", kInterrupt, "input", "iio-interrupt",
                         "<input pin='" + plain_.number_text(5) +
-                            "'/><device driver='mock-adc0' channel='" + std::to_string(kWatched) +
+                            "'/><device driver='mock-adc1' channel='" + std::to_string(kWatched) +
                             "' hysteresis='5' cache_ad_value='false'/>" + all_ranges(),
                         true);
   }
@@ -107,7 +107,7 @@ class Privileges : public SupervisedTest {
   }
 
   TimerTrigger trigger_;
-  MockIio iio_;
+  MockIio iio_{"devices=2"};
   MockSpi spi_;
   GpioSim plain_{"plain", {"", "", "", "", "", ""}};
 };
@@ -136,7 +136,7 @@ TEST_F(Privileges, EveryBackendWorksOnAfterTheDrop) {
   expect_path(true);
   EXPECT_TRUE(reads(kSpi, "open", kOpen));
   EXPECT_TRUE(reads(kIio, "open", kOpen));
-  MockIio::set_value(kWatched, kCut);
+  MockIio::set_value(kWatched, kCut, 1);
   EXPECT_TRUE(reads(kInterrupt, "cut", kCut));
 }
 
@@ -160,8 +160,11 @@ TEST_F(Privileges, ARefreshWithoutRightsSaysWhatIsMissing) {
   }
   EXPECT_EQ(client_.refresh(), "");
   const std::string denied = g_strerror(EACCES);
-  for (const std::string &what : {std::string("/sys/class/gpio/export"), MockSpi::node(0),
-                                  MockSpi::node(1), std::string("trigger"), MockIio::node()}) {
+  const std::string lines = "/sys/class/gpio/";
+  for (const std::string &what :
+       {lines + "unexport", lines + "gpio" + plain_.number_text(0) + "/direction",
+        lines + "gpio" + sim_.number_text(kSioCtrl) + "/active_low", MockSpi::node(0),
+        MockIio::node(1)}) {
     EXPECT_TRUE(logged_together(what, denied)) << what;
   }
   EXPECT_FALSE(in_service("adc"));
@@ -179,9 +182,9 @@ TEST_F(Privileges, WithRightsFromTheDeviceManagerARefreshWorks) {
     EXPECT_EQ(client_.drop(name), std::vector<std::string>{name});
   }
   grant(MockSpi::node(0));
-  grant(MockIio::node());
-  grant_tree(MockIio::folder());
-  plain_.export_low(5);  // a line that is exported already needs no right to export
+  grant(MockIio::node(1));
+  grant_tree(MockIio::folder(1));
+  // The account could not give the line back, so it is there to be used again.
   grant_tree("/sys/class/gpio/gpio" + plain_.number_text(5));
   EXPECT_EQ(client_.refresh(), "");
   EXPECT_TRUE(in_service("adc"));
@@ -189,7 +192,7 @@ TEST_F(Privileges, WithRightsFromTheDeviceManagerARefreshWorks) {
   MockSpi::set_sample(0, kCommand, 1500);
   EXPECT_TRUE(reports(kAdc, true));
   EXPECT_EQ(client_.set_supervised(kInterrupt, true), "");
-  MockIio::set_value(kWatched, kClosed);
+  MockIio::set_value(kWatched, kClosed, 1);
   EXPECT_TRUE(reads(kInterrupt, "closed", kClosed));
 }
 

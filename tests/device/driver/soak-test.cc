@@ -6,7 +6,7 @@
 namespace {
 
 constexpr int kWarmUp = 200;
-constexpr int kRequests = 3000;
+constexpr int kRequests = 2000;
 constexpr long kGrowthKb = 256;
 constexpr int kWatched = 5;
 constexpr unsigned int kCommand = 0x11;

@@ -47,8 +47,8 @@ class Client {
   std::vector<std::string> ports();
   bool answers();
 
-  // What PortChanged said since the last call of forget_changes(), in order, as far as the main loop
-  // has run.
+  // What PortChanged said since the last call of forget_changes(), in order, as far as the main
+  // loop has run.
   const std::vector<PortChange> &changes() const { return changes_; }
   int count_changes(int port) const;
   // -1: none yet.

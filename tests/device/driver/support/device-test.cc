@@ -2,12 +2,24 @@
 
 #include <iostream>
 
+namespace {
+
+constexpr std::size_t kShownLog = 8000;
+
+// The end of a long log is where the failure is.
+std::string end_of_log() {
+  const std::string log = Daemon::log();
+  return log.size() <= kShownLog ? log : "..." + log.substr(log.size() - kShownLog);
+}
+
+}  // namespace
+
 void DeviceTest::TearDown() {
   if (daemon_.running()) {
     expect_clean_stop();
   }
   if (HasFailure()) {
-    std::cout << "--- The daemon's log\n" << Daemon::log() << "\n---\n";
+    std::cout << "--- The daemon's log\n" << end_of_log() << "\n---\n";
   }
 }
 
