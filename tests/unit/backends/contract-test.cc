@@ -13,8 +13,8 @@ enum class Serves { plain, supervised };
 
 struct BackendUnderTest {
   const char *word;  // in the hardware description
-  int kind;
   MakePortFunctions make;
+  int kind;
   Serves serves = Serves::plain;
   PortType type = PORT_CONFIGURABLE;  // that it can be set up as
   bool sets_up = true;                // on a host without the device's hardware
@@ -22,17 +22,14 @@ struct BackendUnderTest {
   std::vector<CheckProperty> properties = {};
 };
 
+const std::vector<CheckProperty> kReadableFile = {{"device", "path", "/dev/null"},
+                                                  {"device", "timeout", "1"}};
+
 const BackendUnderTest kBackends[] = {
-    {"virtual", 0, virtual_backend_functions},
-    {"sysfs",
-     6,
-     sysfs_backend_functions,
-     Serves::plain,
-     PORT_INPUT,
-     true,
-     {{"device", "path", "/dev/null"}, {"device", "timeout", "1"}}},
-    {"null", 8, null_backend_functions},
-    {"check", 9, check_backend_functions},
+    {"virtual", virtual_backend_functions, 0},
+    {"sysfs", sysfs_backend_functions, 6, Serves::plain, PORT_INPUT, true, kReadableFile},
+    {"null", null_backend_functions, 8},
+    {"check", check_backend_functions, 9},
 };
 
 // Printed by GoogleTest in place of the bytes of the struct.

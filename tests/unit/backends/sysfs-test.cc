@@ -369,7 +369,7 @@ TEST_F(Sysfs, PollsOnceAnIntervalHoweverOftenItIsArmed) {
 
 TEST_F(Sysfs, StopsPollingWhenItsPortIsFreed) {
   auto port = watched(dir.write("flag", "2"));
-  const gpointer gone = port.get();
+  IOPort *gone = port.get();
   port.reset();
   EXPECT_EQ(g_main_context_find_source_by_user_data(nullptr, gone), nullptr);
   poll();

@@ -18,6 +18,8 @@ class Documents : public HardwareDescription {
 
 using FirstVirtualInputDeathTest = Documents;
 
+constexpr int kLevelUser = 256;
+
 constexpr const char *kExample = R"(
 <ports>
   <port name="relay1" optional="true">
@@ -62,8 +64,8 @@ TEST_F(Documents, MayHoldAThousandPorts) {
   std::string document = "<ports>";
   for (int i = 0; i < 1000; ++i) {
     const std::string number = std::to_string(i);
-    document += "<port name='port" + number + "'><port_no nbr='" + number +
-                "'/><backend name='check'><device path='x'/></backend></port>";
+    document.append("<port name='port").append(number).append("'><port_no nbr='").append(number);
+    document.append("'/><backend name='check'><device path='x'/></backend></port>");
   }
   ASSERT_TRUE(load(document + "</ports>"));
   EXPECT_EQ(port_registry_count(), 1000U);
@@ -202,7 +204,6 @@ TEST_F(Documents, KeepAPortWithAnEmptyFilter) {
 }
 
 TEST_F(Documents, AskForTheHardwareOnceEach) {
-  constexpr int kLevelUser = 256;
   for (int i = 0; i < 2; ++i) {
     ASSERT_TRUE(load("<ports><port hwid='A1' name='a'/><port hwid='B2' name='b'/></ports>"));
     EXPECT_EQ(log.take_all(G_LOG_LEVEL_WARNING, "Could not get the hardware id"), 2U);

@@ -19,6 +19,7 @@ namespace {
 constexpr int kTurns = 50000;                       // of each thread
 constexpr int kRounds = 1000;                       // of tests that make their ports anew
 constexpr std::int32_t kNotInThisTest = 2'000'000;  // half an hour: only a cancel ends the step
+constexpr std::array<std::int32_t, 5> kTimes = {0, 0, 1, -1, kNotInThisTest};
 constexpr int kPorts = 3;
 
 std::atomic<int> done = 0;
@@ -72,7 +73,6 @@ IOPortRef configurable_output(int number) {
 ActionSequence random_sequence(Dice &dice) {
   ActionSequence sequence{dice.below(4) == 0, {}};
   for (int steps = 1 + dice.below(3); steps > 0; --steps) {
-    constexpr std::array<std::int32_t, 5> kTimes = {0, 0, 1, -1, kNotInThisTest};
     sequence.steps.push_back(
         {dice.below(2) == 0, kTimes[static_cast<std::size_t>(dice.below(kTimes.size()))]});
   }
@@ -100,6 +100,7 @@ void hammer(Work... work) {
 
 TEST_F(SequenceStress, StartsCancelsAndReadersLeaveEveryPortFree) {
   std::vector<IOPortRef> ports;
+  ports.reserve(kPorts);
   for (int number = 0; number < kPorts; ++number) {
     ports.push_back(configurable_output(number));
   }
