@@ -6,10 +6,10 @@
 
 #include "backends/backends.h"
 #include "port/port-registry.h"
+#include "supervised/supervised-backends.h"
 #include "support/log-capture.h"
 #include "support/port-builder.h"
 #include "support/recording-listener.h"
-#include "supervised/supervised-backends.h"
 
 // Frees the ports of the registry at its end: references that a test holds must be gone by then.
 class PortFixture : public testing::Test {
