@@ -111,7 +111,7 @@ gboolean event_producer_send_event(EventProducer * /*producer*/, const Event *ev
   }
   std::string line = "send " + std::to_string(event->id);
   for (const auto &[key, value] : event->inspectable.values) {
-    line += " " + key + "=" + value;
+    line.append(" ").append(key).append("=").append(value);
   }
   library.calls.push_back(line);
   return TRUE;
