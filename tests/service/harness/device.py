@@ -38,7 +38,8 @@ _FOLDERS = (
 )
 
 _BINARY = "/run/test-binaries/portd"
-_PASSED_ON = ("ASAN_OPTIONS", "UBSAN_OPTIONS", "TSAN_OPTIONS", "LSAN_OPTIONS", "LLVM_PROFILE_FILE")
+_SUPPRESSIONS = "/run/test-binaries/tsan.supp"
+_PASSED_ON = ("ASAN_OPTIONS", "UBSAN_OPTIONS", "LSAN_OPTIONS", "LLVM_PROFILE_FILE")
 _SANITIZER_REPORT = re.compile(
     r"ERROR: AddressSanitizer|runtime error:|WARNING: ThreadSanitizer|LeakSanitizer"
 )
@@ -118,6 +119,8 @@ class Device:
         # A file of its own to mount the binary on, so that it is found wherever it was built.
         self.sandbox.bind(_BINARY, self.binary)
         self.write(_BINARY, "").chmod(0o755)
+        self.sandbox.bind(_SUPPRESSIONS, REPOSITORY / "tests/tsan.supp")
+        self.write(_SUPPRESSIONS, "")
         self.write("/etc/passwd", _PASSWD + (_PCD_USER if pcd_user else ""))
         self.write("/etc/group", _GROUP + (_PCD_GROUP if pcd_group else ""))
         self.write("/etc/nsswitch.conf", "passwd: files\ngroup: files\n")
@@ -182,6 +185,8 @@ class Device:
     def _environment(self) -> dict[str, str]:
         env = {name: os.environ[name] for name in _PASSED_ON if name in os.environ}
         env.setdefault("UBSAN_OPTIONS", "print_stacktrace=1")
+        # As the sandbox sees the file: the repository may lie below a folder that is covered.
+        env["TSAN_OPTIONS"] = f"suppressions={_SUPPRESSIONS}"
         env["PATH"] = os.environ["PATH"]
         env["DBUS_SYSTEM_BUS_ADDRESS"] = "unix:path=/run/dbus/system_bus_socket"
         return env
