@@ -208,10 +208,10 @@ int Client::count_changes(int port) const {
 }
 
 int Client::last_reported(int port) const {
-  for (auto change = changes_.rbegin(); change != changes_.rend(); ++change) {
-    if (change->number == port) {
-      return change->state ? 1 : 0;
-    }
+  const auto last = std::find_if(changes_.rbegin(), changes_.rend(),
+                                 [&](const auto &change) { return change.number == port; });
+  if (last == changes_.rend()) {
+    return -1;
   }
-  return -1;
+  return last->state ? 1 : 0;
 }
