@@ -6,7 +6,7 @@
 #include "base/glib-ptr.h"
 #include "port/port-registry.h"
 
-LegacyTest::LegacyTest() : previous_handler_(g_log_set_default_handler(on_log, this)) {
+LegacyTest::LegacyTest() {
   const GCharPtr directory(g_dir_make_tmp("legacy-test-XXXXXX", nullptr));
   directory_ = directory.get();
   backends_register();
@@ -18,7 +18,6 @@ LegacyTest::~LegacyTest() {
     g_unlink(file.c_str());
   }
   g_rmdir(directory_.c_str());
-  g_log_set_default_handler(previous_handler_, nullptr);
 }
 
 IOPort *LegacyTest::add_port(int number, PortType type, const char *flag) {
@@ -43,12 +42,6 @@ std::string LegacyTest::write_file(const char *name, const std::string &contents
 
 std::string LegacyTest::path_of(const char *name) const {
   return directory_ + "/" + name;
-}
-
-void LegacyTest::on_log(const char * /*domain*/, GLogLevelFlags level, const char *message,
-                        gpointer user_data) {
-  static_cast<LegacyTest *>(user_data)->log_.push_back(std::to_string(level & G_LOG_LEVEL_MASK) +
-                                                       ": " + message);
 }
 
 std::string read_file(const std::string &path) {

@@ -8,6 +8,7 @@
 
 #include "backends/check-backend.h"
 #include "port/ioport.h"
+#include "support/log-capture.h"
 
 // Ports on the check backend, in an otherwise empty registry.
 class LegacyTest : public testing::Test {
@@ -24,17 +25,12 @@ class LegacyTest : public testing::Test {
   // Writes a file that goes with the test, and gives its path.
   std::string write_file(const char *name, const std::string &contents);
   std::string path_of(const char *name) const;
-  // Everything logged so far, as "level: text".
-  const std::vector<std::string> &log() const { return log_; }
+  LogCapture &log() { return log_; }
 
  private:
-  static void on_log(const char *domain, GLogLevelFlags level, const char *message,
-                     gpointer user_data);
-
+  LogCapture log_;
   std::string directory_;
   std::vector<std::string> files_;
-  std::vector<std::string> log_;
-  GLogFunc previous_handler_;
 };
 
 std::string read_file(const std::string &path);

@@ -91,19 +91,16 @@ using ObjectsDeathTest = ObjectsTest;
 TEST_F(ObjectsDeathTest, registration_that_fails) {
   add_port(0, PORT_INPUT);
   ASSERT_TRUE(iocontrol_conf_legacy_dbus_register_object(controller_, 0, LEGACY_INTERFACE_INPUT));
-  g_log_set_default_handler(g_log_default_handler, nullptr);
   EXPECT_DEATH(legacy_register_objects(controller_), "Unable to register objects on DBus");
   unreg_port_objects(controller_);
 }
 
 TEST_F(ObjectsDeathTest, introspection_that_cannot_be_parsed) {
-  g_log_set_default_handler(g_log_default_handler, nullptr);
   EXPECT_DEATH(legacy_introspection_parse("<node><interface"),
                "Unable to register objects on DBus");
 }
 
 TEST_F(ObjectsDeathTest, no_bus) {
-  g_log_set_default_handler(g_log_default_handler, nullptr);
   EXPECT_DEATH(
       {
         g_setenv("DBUS_SYSTEM_BUS_ADDRESS", "unix:path=/nonexistent/bus", TRUE);

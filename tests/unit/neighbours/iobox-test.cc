@@ -8,21 +8,14 @@
 #include "backends/iobox-backend.h"
 #include "backends/tables.h"
 #include "port/port-listener.h"
+#include "support/log-capture.h"
 
 namespace {
 
 constexpr int kIoBox = 7;
 constexpr int kNumber = 4;
 
-std::vector<std::string> messages;
 std::vector<PortChange> changes;
-
-void keep_message(const char * /*domain*/, GLogLevelFlags level, const char *text,
-                  gpointer /*user_data*/) {
-  if (level & G_LOG_LEVEL_WARNING) {
-    messages.emplace_back(text);
-  }
-}
 
 void keep_change(const PortChange &change) {
   changes.push_back(change);
@@ -31,19 +24,14 @@ void keep_change(const PortChange &change) {
 class IoBox : public testing::Test {
  protected:
   void SetUp() override {
-    messages.clear();
     changes.clear();
-    default_handler_ = g_log_set_default_handler(keep_message, nullptr);
     port_listener().port_changed = keep_change;
     backends_register();
     io_port_set_number(port(), kNumber);
     io_port_set_backend(port(), kIoBox);
     table_ = iobox_backend_functions(port());
   }
-  void TearDown() override {
-    g_log_set_default_handler(default_handler_, nullptr);
-    port_listener() = {};
-  }
+  void TearDown() override { port_listener() = {}; }
 
   IOPort *port() { return port_.get(); }
   IoBoxBackendData *data() { return static_cast<IoBoxBackendData *>(io_port_backend_data(port())); }
@@ -61,9 +49,9 @@ class IoBox : public testing::Test {
     signal("IOStateChanged", g_variant_new("(is)", number, word));
   }
 
+  LogCapture log_;
   const IOPortRef port_{io_port_new()};
   const PortFunctions *table_ = nullptr;
-  GLogFunc default_handler_ = nullptr;
 };
 
 TEST_F(IoBox, KnowsTheFourWordsForALineState) {
@@ -71,17 +59,16 @@ TEST_F(IoBox, KnowsTheFourWordsForALineState) {
   EXPECT_EQ(iobox_state_to_portd_state("closed"), SUPERVISED_STATE_CLOSED);
   EXPECT_EQ(iobox_state_to_portd_state("short"), SUPERVISED_STATE_SHORT);
   EXPECT_EQ(iobox_state_to_portd_state("cut"), SUPERVISED_STATE_CUT);
-  EXPECT_TRUE(messages.empty());
+  EXPECT_TRUE(log_.empty());
 }
 
 TEST_F(IoBox, TakesAnyOtherWordForUndefinedAndSaysSo) {
   for (const char *word : {"", "Open", "undefined", "closed "}) {
-    messages.clear();
     EXPECT_EQ(iobox_state_to_portd_state(word), SUPERVISED_STATE_UNDEFINED);
-    ASSERT_EQ(messages.size(), 1U);
-    EXPECT_EQ(
-        messages.front(),
-        std::string("iobox_state_to_portd_state@67: Unrecognized iobox supervised state: ") + word);
+    EXPECT_TRUE(log_.took_warning(
+        std::string("iobox_state_to_portd_state@67: Unrecognized iobox supervised state: ") +
+        word));
+    EXPECT_TRUE(log_.empty());
   }
 }
 
@@ -169,7 +156,7 @@ TEST_F(IoBox, IgnoresOtherPortsOtherSignalsAndMalformedOnes) {
   signal("IOStateChanged", g_variant_new("()"));
   EXPECT_EQ(data()->state, SUPERVISED_STATE_OPEN);
   EXPECT_TRUE(changes.empty());
-  EXPECT_TRUE(messages.empty());
+  EXPECT_TRUE(log_.empty());
 }
 
 }  // namespace

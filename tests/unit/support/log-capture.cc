@@ -72,6 +72,11 @@ std::size_t LogCapture::take_all(int level, std::string_view text) {
                        [&](const auto &m) { return m.level == level && m.text == text; });
 }
 
+bool LogCapture::empty() {
+  const std::lock_guard lock(lock_);
+  return messages_.empty();
+}
+
 void LogCapture::forget() {
   const std::lock_guard lock(lock_);
   messages_.clear();
