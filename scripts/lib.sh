@@ -10,7 +10,7 @@ build_packages=(gcc g++ meson ninja-build pkg-config libglib2.0-dev libglib2.0-d
 test_packages=(
   clang-14 clang-format-14 clang-tidy-14 clang-tools-14 libclang-rt-14-dev llvm-14
   libgtest-dev libgmock-dev libumockdev-dev libxml2-utils strace umockdev
-  python3-pytest gir1.2-umockdev-1.0
+  python3-pytest python3-pytest-xdist gir1.2-umockdev-1.0
 )
 
 step() { printf '\n=== %s\n' "$*"; }

@@ -62,7 +62,7 @@ class Soak : public SupervisedTest {
         EXPECT_EQ(client_.set_supervised(kInterrupt, odd), "");
         break;
       case 8:
-        MockIio::set_value(kWatched, odd ? kClosed : kCut);
+        MockIio::set_value(kWatched, static_cast<int>(odd ? kClosed : kCut));
         break;
       case 9:
         EXPECT_EQ(client_.readout(kInterrupt).state, odd ? "closed" : "cut");

@@ -44,7 +44,9 @@ struct Format {
   int shift = 0;
 };
 
-void PrintTo(const Format &format, std::ostream *out) {
+// Printed by GoogleTest in place of the bytes of the struct.
+void PrintTo(const Format &format,  // NOLINT(readability-identifier-naming)
+             std::ostream *out) {
   *out << format.parameters;
 }
 
@@ -128,7 +130,7 @@ TEST_F(SupervisedIio, NoTransitionIsLostAtAKilohertz) {
   gint64 slowest = 0;
   for (bool closed = true; g_get_monotonic_time() < end; closed = !closed) {
     const gint64 begin = g_get_monotonic_time();
-    MockIio::set_value(kChannel, closed ? kClosed : kOpen);
+    MockIio::set_value(kChannel, static_cast<int>(closed ? kClosed : kOpen));
     ++transitions;
     ASSERT_TRUE(wait_until([&] { return client_.count_changes(0) >= transitions; }))
         << "transition " << transitions;

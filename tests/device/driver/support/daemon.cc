@@ -15,8 +15,6 @@
 #include "support/files.h"
 #include "support/wait.h"
 
-extern char **environ;
-
 namespace {
 
 constexpr const char *kProgram = "/usr/bin/portd";
