@@ -1,7 +1,5 @@
-// Parsed once for all files of a library. Every file still includes what it uses: the gcc build of
+// Precompiled for all files of a library. Every file still includes what it uses: the gcc build of
 // scripts/test does without this header.
-#pragma once
-
 #include <gio/gio.h>
 
 #include <algorithm>

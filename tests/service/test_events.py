@@ -4,7 +4,7 @@ from typing import Any
 
 import pytest
 
-from harness import Device, Signals, hwdesc, port
+from harness import DBusError, Device, Signals, hwdesc, port, wait_for
 
 PATH = "/com/kelv/Event/pcd"
 INTERFACE = "com.kelv.Event.Producer"
@@ -29,8 +29,17 @@ class Producer:
         self._device = device
 
     def declarations(self) -> dict[int, dict[str, Any]]:
-        owner = "com.kelv.IOControl.State"
-        return dict(self._device.bus.call(owner, PATH, INTERFACE, "List"))
+        (declared,) = wait_for(self._list, "the producer's object")
+        return dict(declared)
+
+    def _list(self) -> tuple | None:
+        """None as long as the object is not there, which comes soon after the daemon's name."""
+        try:
+            return (self._device.bus.call("com.kelv.IOControl.State", PATH, INTERFACE, "List"),)
+        except DBusError as error:
+            if error.name != "org.freedesktop.DBus.Error.UnknownMethod":
+                raise
+            return None
 
     def signals(self, member: str) -> Signals:
         return self._device.signals(member, interface=INTERFACE, path=PATH)

@@ -1,7 +1,5 @@
-// Parsed once for all files of a test program. Every file still includes what it uses: the gcc
+// Precompiled for all files of a test program. Every file still includes what it uses: the gcc
 // build of scripts/test does without this header.
-#pragma once
-
 #include <gio/gio.h>
 #include <gtest/gtest.h>
 
