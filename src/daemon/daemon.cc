@@ -67,6 +67,7 @@ void load_hardware_description() {
   backends_register();
   supervised_backends_register();
   hwdesc_load_file(kHardwareDescription);
+  legacy_remove_unfinished();
   hwdesc_load_directory(kHardwareFragments);
 }
 
@@ -172,6 +173,8 @@ void shut_down(Daemon &daemon) {
 
 int daemon_run(int argc, char **argv) {
   read_arguments(argc, argv);
+  // Whoever collects the output is to see each line when it is written.
+  (void)std::setvbuf(stdout, nullptr, _IOLBF, 0);
   kv_log_stdout();
   Daemon daemon;
   daemon.loop.reset(g_main_loop_new(nullptr, FALSE));

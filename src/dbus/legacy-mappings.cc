@@ -2,11 +2,16 @@
 
 #include <unistd.h>
 
+#include <cerrno>
 #include <cstdint>
 #include <cstdio>
+#include <memory>
+#include <string_view>
 
+#include "base/glib-ptr.h"
 #include "base/log.h"
 #include "dbus/legacy-documents.h"
+#include "platform/confutils.h"
 #include "port/port-registry.h"
 
 namespace {
@@ -29,17 +34,43 @@ std::vector<LegacyPort> legacy_ports() {
 // What can't be moved must not stay: the folder is that of the hardware descriptions, and the next
 // start would read it as one.
 bool replace(const char *path, const std::string &text) {
-  if (!g_file_set_contents(kTemporary, text.data(), static_cast<gssize>(text.size()), nullptr)) {
+  const auto size = static_cast<gssize>(text.size());
+  if (!g_file_set_contents(kTemporary, text.data(), size, nullptr)) {
     return false;
   }
-  if (rename(kTemporary, path) != 0) {
-    unlink(kTemporary);
-    return false;
+  if (rename(kTemporary, path) == 0) {
+    return true;
   }
-  return true;
+  const bool elsewhere = errno == EXDEV;
+  unlink(kTemporary);
+  // A service manager that lets the daemon write single folders makes each a mount of its own.
+  return elsewhere && confutils_set_file_contents_with_sync(path, text.data(), size, nullptr);
+}
+
+// The temporary file, or what GLib calls it until it is whole.
+bool is_temporary(const std::string &path) {
+  constexpr std::size_t suffix = std::string_view(".XXXXXX").size();
+  const std::string_view whole(kTemporary);
+  return path == whole ||
+         (path.starts_with(std::string(whole) + ".") && path.size() == whole.size() + suffix);
 }
 
 }  // namespace
+
+void legacy_remove_unfinished() {
+  const GCharPtr folder(g_path_get_dirname(kTemporary));
+  const std::unique_ptr<GDir, GlibDeleter<g_dir_close>> entries(
+      g_dir_open(folder.get(), 0, nullptr));
+  if (!entries) {
+    return;
+  }
+  while (const char *name = g_dir_read_name(entries.get())) {
+    const std::string path = std::string(folder.get()) + "/" + name;
+    if (is_temporary(path)) {
+      unlink(path.c_str());
+    }
+  }
+}
 
 void legacy_write_mappings() {
   const std::vector<LegacyPort> ports = legacy_ports();

@@ -106,11 +106,12 @@ bool iocontrol_conf_legacy_dbus_register_object(LegacyController &controller, in
 }
 
 void legacy_register_objects(LegacyController &controller) {
+  const int count = hwdesc_first_virtual_input().value_or(kDefaultPorts);
   // The counts are read from the first object, whatever ports there are.
-  if (!port_registry_find(0)) {
+  if (count <= 0 || !port_registry_find(0)) {
     register_or_end(controller, 0, LEGACY_INTERFACE_PORT);
   }
-  for (const int number : numbers_below(hwdesc_first_virtual_input().value_or(kDefaultPorts))) {
+  for (const int number : numbers_below(count)) {
     if (const IOPortRef ioport = port_registry_find(static_cast<std::uint32_t>(number))) {
       register_port(controller, ioport.get());
     }

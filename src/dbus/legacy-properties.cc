@@ -196,14 +196,11 @@ Outcome change_direction(const Request &request, bool input) {
 }
 
 Outcome set_direction(const Request &request) {
-  const auto word = text_of(request.value);
-  if (!word) {
-    return refuse_value(request);
-  }
-  const auto input = parse_direction(*word);
+  const std::string word = text_of(request.value).value_or("");
+  const auto input = parse_direction(word);
   if (!input) {
-    log_warning("Undefined input: %s, for property: %s", word->c_str(), request.property);
-    return refuse(request, "Bad Direction '" + *word + "'");
+    log_warning("Undefined input: %s, for property: %s", word.c_str(), request.property);
+    return refuse(request, "Bad Direction '" + word + "'");
   }
   return change_direction(request, *input);
 }

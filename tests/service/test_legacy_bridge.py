@@ -357,7 +357,8 @@ def test_byte_strings_that_are_no_text(tool, number):
         for name in set(WRITABLE[interface]) - set(NUMBERS):
             for raw in (b"", b"open", b"output", b"pulse", b"\xff\xfe\0", b"Caf\xe9\0", b"\xc0\x80\0"):
                 message = fails(INVALID, tool.set_variant, number, interface, name, text(raw))
-                assert message == f"Incorrect value for {name}"
+                expected = "Bad Direction ''" if name == "Direction" else f"Incorrect value for {name}"
+                assert message == expected
     assert {i: tool.get_all(number, i) for i in tool.interfaces(number)} == before
     assert settings_identity(tool.device) == saved
 
@@ -496,6 +497,17 @@ def test_files_are_written_after_the_settings_and_as_root(device):
     assert device.path(REGISTRY).stat().st_uid == os.geteuid()
 
 
+def test_a_count_of_no_ports_leaves_the_object_of_the_counts(device):
+    device.conf(four_ports(count_of_ports(0)))
+    device.start()
+    tool = Tool(device)
+    assert tool.get(0, BASE, "NbrOfInputs") == 2
+    with pytest.raises(DBusError):
+        tool.get(0, INPUT, "Name")
+    with pytest.raises(DBusError):
+        tool.get(1, BASE, "NbrOfInputs")
+
+
 def test_old_files_are_replaced(device):
     device.write(REGISTRY, "old")
     device.write(MAPPINGS, "old")
@@ -512,6 +524,45 @@ def test_a_mapping_that_cannot_be_written(device):
     device.wait_log("Couldn't write to legacy mappings")
     assert device.read(REGISTRY) == golden("registry.conf")
     assert not device.path(TEMPORARY).exists()
+
+
+@pytest.mark.parametrize("path", [REGISTRY, MAPPINGS])
+def test_a_folder_on_a_mount_of_its_own(make_device, path):
+    device = make_device(tmpfs={str(Path(path).parent): "64k"})
+    device.conf(four_ports())
+    device.start()
+    assert device.read(REGISTRY) == golden("registry.conf")
+    assert device.read(MAPPINGS) == golden("mapping.xml")
+    assert not device.path(TEMPORARY).exists()
+
+
+def test_a_mapping_without_room_leaves_the_new_registry(make_device):
+    device = make_device(tmpfs={str(Path(MAPPINGS).parent): "4k"})
+    device.write(REGISTRY, "old")
+    device.write(f"{MAPPINGS}.more", "x" * 4096)
+    device.conf(four_ports())
+    device.start()
+    device.wait_log("Couldn't write to legacy mappings")
+    assert device.read(REGISTRY) == golden("registry.conf")
+    assert not device.path(MAPPINGS).exists()
+
+
+@pytest.mark.parametrize("left_over", [TEMPORARY, f"{TEMPORARY}.XB3F0A"])
+def test_what_a_power_failure_left_over_is_no_hardware_description(device, left_over):
+    device.conf(four_ports())
+    device.write(left_over, "<mapping><group")
+    for number in range(4, 8):
+        device.fragment(f"{number}.xml", hwdesc(port(f"more{number}", number)))
+    device.start()
+    assert sorted(props.number for props in device.port_props()) == list(range(8))
+    assert not device.path(left_over).exists()
+
+
+def test_other_fragments_with_a_name_like_it_stay(device):
+    device.conf(four_ports())
+    device.fragment("legacy.tmp.xml", hwdesc(port("more", 4)))
+    device.start()
+    assert len(device.port_props()) == 5
 
 
 def test_no_room_for_the_temporary_file(device):

@@ -203,16 +203,14 @@ def test_a_missing_name_loses_the_ports_own_and_ends_the_reading(device):
     assert device.call("GetNames", "u", IN) == ("Input 1", "")
     assert device.call("GetActive", "u", IN) == ("closed", "closed")
     assert device.stderr().startswith("Error parsing param file: ")
-    device.stop()
-    assert "No input name for port in:0\n" in device.log()
+    device.wait_log("No input name for port in:0")
 
 
 def test_a_missing_output_name_is_told_too(device):
     device.settings("[out]\noutput_activelow=true\n")
     device.start()
     assert device.stderr().startswith("Error parsing param file: ")
-    device.stop()
-    assert "No output name for port out:1\n" in device.log()
+    device.wait_log("No output name for port out:1")
 
 
 def test_a_negative_delay_time_is_a_very_large_number(device):

@@ -29,10 +29,10 @@ bool fail(GError **error, const char *what, const std::string &path) {
 bool write_all(int fd, std::string_view data) {
   while (!data.empty()) {
     const ssize_t written = write(fd, data.data(), data.size());
-    if (written < 0) {
-      if (errno == EINTR) {
-        continue;
-      }
+    if (written < 0 && errno == EINTR) {
+      continue;
+    }
+    if (written <= 0) {
       return false;
     }
     data.remove_prefix(static_cast<size_t>(written));

@@ -124,8 +124,8 @@ TEST_F(PropertiesTest, values_of_other_types_change_nothing) {
     EXPECT_EQ(set(0, kLegacyOutputInterface, name, g_variant_new_uint32(1)),
               std::string("Incorrect value for ") + name);
   }
-  EXPECT_EQ(set(0, kLegacyService, "Direction", g_variant_new_boolean(TRUE)),
-            "Incorrect value for Direction");
+  EXPECT_EQ(set(0, kLegacyService, "Direction", g_variant_new_boolean(TRUE)), "Bad Direction ''");
+  EXPECT_TRUE(log().took_warning("Undefined input: , for property: Direction"));
   EXPECT_EQ(input_name(ioport), "kept");
 }
 
@@ -134,6 +134,8 @@ TEST_F(PropertiesTest, bytes_that_are_no_text_change_nothing) {
   io_port_restore_name(ioport, "kept", true);
   for (const std::string_view raw : {""sv, "bare"sv, "\xff\0"sv, "a\0b"sv}) {
     EXPECT_EQ(set(0, kLegacyInputInterface, "Name", bytes(raw)), "Incorrect value for Name");
+    EXPECT_EQ(set(0, kLegacyService, "Direction", bytes(raw)), "Bad Direction ''");
+    EXPECT_TRUE(log().took_warning("Undefined input: , for property: Direction"));
   }
   EXPECT_EQ(input_name(ioport), "kept");
 }
