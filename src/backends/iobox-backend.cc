@@ -209,7 +209,7 @@ bool set_supervised(IOPort *ioport, bool /*supervised*/) {
   return true;
 }
 
-const SupervisedRanges &get_supervised_ranges(IOPort *ioport) {
+SupervisedRanges get_supervised_ranges(IOPort *ioport) {
   return io_port_range_list(ioport);
 }
 

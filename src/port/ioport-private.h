@@ -44,6 +44,10 @@ struct IOPort {
   std::uint32_t spare_setting = 1;
 
   IoEvents events;
+
+  // An action thread classifies a line while the main thread replaces the list. Nothing else is
+  // locked while this is held.
+  mutable std::mutex ranges_lock;
   SupervisedRanges supervised_ranges;
 
   // What an action thread reads while the main thread may write it.
@@ -54,7 +58,8 @@ struct IOPort {
   std::atomic<bool> events_enabled = true;
   std::atomic<bool> set_up = false;
 
-  // Serialises state writes. An action thread holds it for its whole sequence but for its waits.
+  // Serialises state writes, and keeps what a step sends apart from a new declaration. An action
+  // thread holds it for each step, not between them.
   std::mutex lock;
 
   // Guards the two flags below. Taken before `lock`, never while `lock` is held.

@@ -7,7 +7,10 @@ bool name_in_use(const IOPort *ioport, bool input) {
   return ioport->type != PORT_CONFIGURABLE || ioport->direction == input;
 }
 
+// A step of a running sequence comes before the new declaration or after it: in between it would be
+// sent to nobody.
 bool set_name(IOPort *ioport, bool input, const std::string &name) {
+  const std::lock_guard lock(ioport->lock);
   auto &held = input ? ioport->input_name : ioport->output_name;
   if (held == name) {
     return true;

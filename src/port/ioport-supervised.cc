@@ -43,12 +43,14 @@ bool io_port_set_supervised(IOPort *port, bool supervised) {
   return true;
 }
 
-const SupervisedRanges &io_port_range_list(const IOPort *ioport) {
+SupervisedRanges io_port_range_list(const IOPort *ioport) {
+  const std::lock_guard lock(ioport->ranges_lock);
   return ioport->supervised_ranges;
 }
 
 void io_port_store_range_list(IOPort *ioport, SupervisedRanges ranges) {
-  ioport->supervised_ranges = std::move(ranges);
+  const std::lock_guard lock(ioport->ranges_lock);
+  ioport->supervised_ranges.swap(ranges);
 }
 
 bool io_port_get_supervised_ranges(IOPort *port, SupervisedRanges *ranges) {

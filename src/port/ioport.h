@@ -189,10 +189,10 @@ bool io_port_is_supervisable(IOPort *ioport);
 // False unless the port is supervisable.
 bool io_port_set_supervised(IOPort *ioport, bool supervised);
 // The port's own range list, for the backends that keep theirs here: unlike a backend's record it
-// stays while the port is out of service.
-const SupervisedRanges &io_port_range_list(const IOPort *ioport);
+// stays while the port is out of service. Any thread.
+SupervisedRanges io_port_range_list(const IOPort *ioport);
 void io_port_store_range_list(IOPort *ioport, SupervisedRanges ranges);
-// Copies the port's ranges; false unless the port is supervisable.
+// Copies the port's ranges; false unless the port is supervisable. Any thread.
 bool io_port_get_supervised_ranges(IOPort *ioport, SupervisedRanges *ranges);
 // False, at times without an error, when they were refused.
 bool io_port_set_supervised_ranges(IOPort *ioport, SupervisedRanges ranges, GError **error);
@@ -200,10 +200,12 @@ bool io_port_set_supervised_ranges(IOPort *ioport, SupervisedRanges ranges, GErr
 // read as signed 32-bit numbers. False and `error` when the range is refused.
 bool io_port_set_supervised_range(IOPort *ioport, const char *state, std::uint32_t lower,
                                   std::uint32_t upper, GError **error);
+// The state of the line and the level in raw converter codes. False and `error` when the port has
+// none or it can't be read. Any thread.
 bool io_port_get_supervised_readout(IOPort *ioport, SupervisedRangeState *state,
                                     std::uint32_t *level, GError **error);
 // The state of the line: undefined when the readout fails, open (0) for a port that is not set up
-// or not supervisable.
+// or not supervisable. Any thread.
 SupervisedRangeState io_port_get_supervised_state(IOPort *ioport);
 
 // --- Events -------------------------------------------------------------------------------------
@@ -227,7 +229,9 @@ bool io_port_got_port_any(IOPort *ioport);
 
 struct ActionStep {
   bool state;
-  std::int32_t time_ms;  // how long the state is held before the next step; below 1: not at all
+  // How long the state is held before the next step; 0: not at all. Counted in microseconds in 32
+  // bits, which wrap: a time above 2,147,483 ms may end early, one below -2,147,483 ms may wait.
+  std::int32_t time_ms;
 };
 
 struct ActionSequence {

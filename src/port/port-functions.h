@@ -24,12 +24,15 @@ struct PortFunctions {
   // Brings the hardware up; an output starts at the raw level `initial_level`. False: it could not,
   // and the reason is in the log.
   bool (*setup)(IOPort *port, bool initial_level) = nullptr;
+  // Also from action threads.
   bool (*is_supervisable)(IOPort *port) = nullptr;
   bool (*set_supervised)(IOPort *port, bool supervised) = nullptr;
-  const SupervisedRanges &(*get_supervised_ranges)(IOPort *port) = nullptr;
+  // Also from action threads.
+  SupervisedRanges (*get_supervised_ranges)(IOPort *port) = nullptr;
   // Takes the list over, or refuses it and sets `error`.
   bool (*set_supervised_ranges)(IOPort *port, SupervisedRanges ranges, GError **error) = nullptr;
-  // The state of the line and the level in raw converter codes, or false and `error`.
+  // The state of the line and the level in raw converter codes, or false and `error`. Also from
+  // action threads: a step that is only reported sends the state of the line with its event.
   bool (*get_supervised_readout)(IOPort *port, SupervisedRangeState *state, std::uint32_t *level,
                                  GError **error) = nullptr;
   // The raw level, 0 or 1; 2 and more mean unknown. Also from action threads.

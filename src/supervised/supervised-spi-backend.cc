@@ -27,6 +27,9 @@ struct SpiSupervisedData : SupervisedData {
   std::string path;          // of the spidev node
   std::uint32_t speed = 0;   // hertz; 0: the device's default
   std::uint8_t address = 0;  // tells the converter what to measure
+  // For the descriptor, which an action thread may read through and lose. Nothing else is locked
+  // while it is held.
+  std::mutex fd_lock;
   UniqueFd fd;
 };
 
@@ -98,16 +101,27 @@ bool set_supervised(IOPort *port, bool supervised) {
   return supervised_switch(port, supervised, supervised, kParts);
 }
 
-// A transfer that failed costs the device until the port is set up again.
+// A transfer that failed costs the device until the port is set up again. Unset, with errno: it
+// did.
+std::optional<int> read_sample(SpiSupervisedData *data) {
+  const std::lock_guard lock(data->fd_lock);
+  const auto sample = spi_read_sample(data->fd.get(), data->address);
+  if (!sample) {
+    const int reason = errno;
+    data->fd.reset();
+    errno = reason;
+  }
+  return sample;
+}
+
 bool get_supervised_readout(IOPort *port, SupervisedRangeState *state, std::uint32_t *level,
                             GError **error) {
   SpiSupervisedData *data = data_of(port);
   *state = SUPERVISED_STATE_UNDEFINED;
-  const auto sample = spi_read_sample(data->fd.get(), data->address);
+  const auto sample = read_sample(data);
   if (!sample) {
     const char *reason = g_strerror(errno);
     log_critical("Error: %s", reason);
-    data->fd.reset();
     g_set_error_literal(error, io_supervised_error_quark(), IO_SUPERVISED_ERROR_GENERIC, reason);
     return false;
   }

@@ -50,7 +50,7 @@ bool supervised_classify_for_port(IOPort *port, std::uint32_t level, SupervisedR
   return true;
 }
 
-const SupervisedRanges &supervised_ranges_get(IOPort *port) {
+SupervisedRanges supervised_ranges_get(IOPort *port) {
   return io_port_range_list(port);
 }
 

@@ -15,7 +15,7 @@ bool supervised_classify_for_port(IOPort *port, std::uint32_t level, SupervisedR
 
 // For the backends' tables: the port's own list, and its replacement. An empty list is no list and
 // is refused.
-const SupervisedRanges &supervised_ranges_get(IOPort *port);
+SupervisedRanges supervised_ranges_get(IOPort *port);
 bool supervised_ranges_set(IOPort *port, SupervisedRanges ranges, GError **error);
 
 // Adds the words for the states that a supervised port can tell apart, in the order that clients

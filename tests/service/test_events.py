@@ -298,12 +298,20 @@ def test_events_and_changes_of_a_sequence_come_in_the_order_of_its_steps(start):
 
 def test_renaming_a_port_while_its_sequence_sends_events_harms_neither(start):
     device, producer = start(port("relay", 0, kind="output", extra=IOPORT + PORT_ANY))
-    with device.signals("ActionSequenceDone") as done:
-        steps = [(index % 2 == 0, 0) for index in range(3000)]
+    steps = [(index % 2 == 0, 0) for index in range(3000)]
+    with (
+        device.signals("ActionSequenceDone") as done,
+        device.signals("PortChanged") as changed,
+        producer.signals("Sent") as sent,
+    ):
         device.call("StartActionSequence", "uba(bi)", 0, False, steps)
         for index in range(100):
             device.call("SetName", "ubs", 0, False, f"Name {index}")
         done.wait(timeout=30)
+        assert len(changed.received) == len(steps)
+        assert [values["state"] for _id, values in sent.received if "port" in values] == [
+            state for state, _time in steps
+        ]
     assert producer.only("", port=0)["nice_names"]["port"] == ("Port", "Name 99")
 
 

@@ -132,6 +132,21 @@ def test_one_failed_transfer_costs_the_device_until_it_is_refreshed(device, conv
     wait_readout(device, "closed", 0x150)
 
 
+def test_ranges_change_while_a_sequence_sends_the_state_of_the_line(device, converters):
+    event = '<event declaration="com.kelv.Event.Pcd.SupervisedPort" supervised_input="true"/>'
+    start(device, spi(event=event))
+    converters.answer(0x150)
+    supervise(device)
+    for _round in range(3):
+        with device.signals("ActionSequenceDone") as done:
+            steps = [(index % 2 == 0, 0) for index in range(3000)]
+            device.call("StartActionSequence", "uba(bi)", 0, True, steps)
+            for state in ("open", "closed", "cut") * 30:
+                supervised(device, "SetSupervisedRanges", "usuu", 0, state, 0x100, 0x1FF)
+            done.wait(timeout=30)
+    assert readout(device) == ("cut", 0x150)
+
+
 def test_a_missing_device_parks_an_optional_port_until_it_is_there(device, converters):
     device.allow_critical("Failed to open")
     node = converters.folder / "spidev0"

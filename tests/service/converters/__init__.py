@@ -61,11 +61,11 @@ def range_element(state: str, lower: int, upper: int) -> str:
 
 def supervised_port(
     backend: str, elements: str, number: int = 0, kind: str = "input", optional: bool = False,
-    flags: str = "ioport", name: Optional[str] = None,
+    flags: str = "ioport", name: Optional[str] = None, event: str = "",
 ) -> str:  # fmt: skip
     """A port with the usual pins."""
     pins = PINS + (OUTPUT_PIN if kind == "io_ctrl" else "")
-    section = f'<backend name="{backend}">{pins}{elements}</backend>'
+    section = f'<backend name="{backend}">{pins}{elements}</backend>{event}'
     return port(
         name or f"line{number}", number, kind, backend=None, extra=section, optional=optional,
         flags=flags,

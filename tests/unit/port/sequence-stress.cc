@@ -174,6 +174,30 @@ TEST_F(SequenceStress, LookupsKeepPortsAliveThatAreReplacedMeanwhile) {
   EXPECT_EQ(port_registry_count(), static_cast<std::size_t>(kPorts));
 }
 
+TEST_F(SequenceStress, AStepSeesAWholeListOfRanges) {
+  port_listener().send_event = [](IOPort *port, IoEvent *, std::int32_t) {
+    const SupervisedRanges ranges = io_port_range_list(port);
+    EXPECT_EQ(ranges.size(), static_cast<std::size_t>(ranges.front().upper));
+    ++sent;
+  };
+  const auto port = PortBuilder().event(event_for_inputs("alarm")).set_up_and_registered();
+  io_port_store_range_list(port.get(), {{SUPERVISED_STATE_OPEN, 1, 0}});
+  constexpr int sequences = 50;
+  constexpr int steps = 1000;
+  int started = 0;
+  for (std::uint32_t length = 1; started < sequences; length = 1 + length % 5) {
+    if (!io_port_is_busy(port.get())) {
+      ASSERT_TRUE(io_port_run_action_sequence(port.get(),
+                                              {true, std::vector<ActionStep>(steps, {true, 0})}));
+      ++started;
+    }
+    io_port_store_range_list(port.get(),
+                             SupervisedRanges(length, {SUPERVISED_STATE_OPEN, length, 0}));
+  }
+  io_port_wait_for_action_threads();
+  EXPECT_EQ(sent, sequences * steps);
+}
+
 TEST_F(SequenceStress, TheLastReferenceMayGoAnywhere) {
   int started = 0;
   for (int round = 0; round < kRounds; ++round) {

@@ -24,7 +24,7 @@ bool set_supervised(IOPort *port, bool supervised) {
   return true;
 }
 
-const SupervisedRanges &get_ranges(IOPort *port) {
+SupervisedRanges get_ranges(IOPort *port) {
   return data_of(port).ranges;
 }
 
