@@ -4,6 +4,7 @@
 
 #include <mutex>
 
+#include "backends/edge-watch.h"
 #include "backends/libugpio-utils.h"
 #include "base/source.h"
 #include "port/ioport.h"
@@ -14,15 +15,10 @@ struct SupervisedData : PortBackendData {
   GpioPinPtr input;
   GpioPinPtr output;
   int io_ctrl_level = -1;  // the last one driven; -1: none
-  // For the pins' handles, since action threads drive the output, and for `seen` and `settling`.
-  // Nothing else is locked while it is held.
+  // For the pins' handles, since action threads drive the output. Nothing else is locked while it
+  // is held.
   std::mutex pins_lock;
-
-  // What the plain pin read last while its edges were watched; -1: nothing yet.
-  int seen = -1;
-  bool settling = false;  // its changes are being read and reported
-  Source edge_watch;
-  Source edge_recheck;  // the pin must be looked at without an edge
+  EdgeWatch edges{pins_lock, G_IO_PRI};  // of the plain pin
 
   Source poll;
   // The entry of this port in what would be a table by port number. Held here it serves every

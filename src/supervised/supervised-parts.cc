@@ -20,6 +20,7 @@ bool setup_input(IOPort *port, const SupervisedParts &parts) {
 bool supervised_setup(IOPort *port, bool initial_level, const SupervisedParts &parts) {
   SupervisedData *data = supervised_data(port);
   data->initialised = false;
+  data->edges.stop();  // a line that is requested anew has another descriptor
   if (!supervised_check_pins(port)) {
     return false;
   }

@@ -158,6 +158,14 @@ def test_an_input_reads_its_line(device, lines):
         assert state(device) is bool(level)
 
 
+def test_a_change_that_a_client_finds_first_is_reported(device, lines):
+    start(device, gpio("input", input='pin="11"'))
+    with device.signals("PortChanged") as changed:
+        lines.set_value(INPUT, 1)
+        assert state(device)
+        assert changed.wait().state
+
+
 def test_an_output_is_driven_and_reported(device, lines):
     start(device, gpio("output", output='pin="12"'))
     lines.wait(*LOW_OUTPUT_WRITES)

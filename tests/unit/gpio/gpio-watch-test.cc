@@ -91,19 +91,8 @@ TEST_F(GpioBackendTest, AnEdgeIsAcknowledgedWhileEventsAreOff) {
   EXPECT_TRUE(reported.empty());
 }
 
-TEST_F(GpioBackendTest, AnEdgeIsAcknowledgedWhileThePortCountsAsNotSetUp) {
-  const PortFunctions *functions = gpio_backend_functions(make_input());
-  EXPECT_TRUE(functions->setup(port(), false));
-  functions->start_watch(port());
-  line("1").edge(1);
-  EXPECT_EQ(serve(), 1);
-  EXPECT_FALSE(line("1").signals());
-  EXPECT_EQ(reported, States{false});
-}
-
 TEST_F(GpioBackendTest, AClientThatReadsFirstDoesNotSwallowTheChange) {
   make_watched_input();
-  EXPECT_FALSE(io_port_get_state(port()));
   line("1").edge(1);
   EXPECT_TRUE(io_port_get_state(port()));
   EXPECT_FALSE(line("1").signals());
@@ -113,7 +102,6 @@ TEST_F(GpioBackendTest, AClientThatReadsFirstDoesNotSwallowTheChange) {
 
 TEST_F(GpioBackendTest, AClientThatReadsDuringTheEdgeCausesNoSecondReport) {
   make_watched_input();
-  EXPECT_FALSE(io_port_get_state(port()));
   line("1").acknowledges = false;
   line("1").edge(1);
   EXPECT_TRUE(io_port_get_state(port()));
@@ -191,6 +179,17 @@ TEST_F(GpioBackendTest, AClientWhoseReadFailsDoesNotSwallowTheChange) {
   line("1").read_error = 0;
   serve();
   EXPECT_EQ(reported, States{true});
+}
+
+TEST_F(GpioBackendTest, AClientWhoseReadFailsInventsNoChange) {
+  make_watched_input();
+  line("1").read_error = EIO;
+  EXPECT_TRUE(io_port_get_state(port()));
+  EXPECT_EQ(seams().intervals, std::vector<guint>{1000});
+  line("1").read_error = 0;
+  serve();
+  EXPECT_TRUE(reported.empty());
+  EXPECT_EQ(seams().alive_fd_watches(), 1);
 }
 
 TEST_F(GpioBackendTest, AfterAnUnacknowledgedFailureTheWatchComesBackWithTheLine) {
