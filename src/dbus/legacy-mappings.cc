@@ -52,7 +52,7 @@ bool is_temporary(const std::string &path) {
   constexpr std::size_t suffix = std::string_view(".XXXXXX").size();
   const std::string_view whole(kTemporary);
   return path == whole ||
-         (path.starts_with(std::string(whole) + ".") && path.size() == whole.size() + suffix);
+         (path.starts_with(std::string(whole) + '.') && path.size() == whole.size() + suffix);
 }
 
 }  // namespace
@@ -65,7 +65,7 @@ void legacy_remove_unfinished() {
     return;
   }
   while (const char *name = g_dir_read_name(entries.get())) {
-    const std::string path = std::string(folder.get()) + "/" + name;
+    const std::string path = std::string(folder.get()) + '/' + name;
     if (is_temporary(path)) {
       unlink(path.c_str());
     }

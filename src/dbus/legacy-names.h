@@ -13,5 +13,5 @@ inline constexpr const char *kLegacyOutputInterface =
 inline constexpr const char *kLegacyBasePath = "/com/kelv/Configuration/Legacy/IOControl/IOPort";
 
 inline std::string legacy_object_path(int number) {
-  return std::string(kLegacyBasePath) + "/" + std::to_string(number);
+  return std::string(kLegacyBasePath) + '/' + std::to_string(number);
 }

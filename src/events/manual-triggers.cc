@@ -99,7 +99,7 @@ void follow_channel(int number, GObjectPtr<GDBusProxy> proxy) {
 
 // False: there is no such channel.
 bool adopt_channel(int number) {
-  const std::string object = std::string(kChannelRoot) + "/" + std::to_string(number);
+  const std::string object = std::string(kChannelRoot) + '/' + std::to_string(number);
   GObjectPtr<GDBusProxy> proxy = make_proxy(kStreamer, object.c_str(), kChannelInterface);
   if (!proxy || !GStrvPtr(g_dbus_proxy_get_cached_property_names(proxy.get()))) {
     return false;
