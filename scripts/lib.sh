@@ -9,7 +9,7 @@ run_packages=(dbus python3 python3-dbusmock python3-gi util-linux)
 build_packages=(gcc g++ meson ninja-build pkg-config libglib2.0-dev libglib2.0-dev-bin libgpiod-dev)
 test_packages=(
   clang-14 clang-format-14 clang-tidy-14 clang-tools-14 libclang-rt-14-dev llvm-14
-  libgtest-dev libgmock-dev libumockdev-dev libxml2-utils strace umockdev
+  libgtest-dev libgmock-dev libumockdev-dev libxml2-utils shellcheck strace umockdev
   python3-pytest python3-pytest-xdist gir1.2-umockdev-1.0
 )
 
