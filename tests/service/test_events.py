@@ -1,13 +1,10 @@
 """Events of ports on the device's event system, as any service sees them on the bus."""
 
-from typing import Any
-
 import pytest
 
-from harness import DBusError, Device, Signals, hwdesc, port, wait_for
+from harness import Device, hwdesc, port
+from producer import Producer
 
-PATH = "/com/kelv/Event/pcd"
-INTERFACE = "com.kelv.Event.Producer"
 SUPERVISED = "com.kelv.Event.Pcd.SupervisedPort"
 
 IOPORT = '<event declaration="IOPort"/>'
@@ -20,41 +17,6 @@ def key(name: str, value: str, kind: str, more: str = "") -> str:
 
 def event(declaration: str, *keys: str, attributes: str = "") -> str:
     return f'<event declaration="{declaration}" {attributes}>{"".join(keys)}</event>'
-
-
-class Producer:
-    """The daemon's event producer, looked at from a neighbour service."""
-
-    def __init__(self, device: Device):
-        self._device = device
-
-    def declarations(self) -> dict[int, dict[str, Any]]:
-        (declared,) = wait_for(self._list, "the producer's object")
-        return dict(declared)
-
-    def _list(self) -> tuple | None:
-        """None as long as the object is not there, which comes soon after the daemon's name."""
-        try:
-            return (self._device.bus.call("com.kelv.IOControl.State", PATH, INTERFACE, "List"),)
-        except DBusError as error:
-            if error.name != "org.freedesktop.DBus.Error.UnknownMethod":
-                raise
-            return None
-
-    def signals(self, member: str) -> Signals:
-        return self._device.signals(member, interface=INTERFACE, path=PATH)
-
-    def ids(self, kind: str, **keys: Any) -> list[int]:
-        """Declarations of a type ("" for the built-in ones) that hold the given key values."""
-        return [
-            number
-            for number, entry in self.declarations().items()
-            if entry["type"] == kind and keys.items() <= entry["keys"].items()
-        ]
-
-    def only(self, kind: str, **keys: Any) -> dict[str, Any]:
-        (number,) = self.ids(kind, **keys)
-        return self.declarations()[number]
 
 
 @pytest.fixture
