@@ -12,7 +12,6 @@
 
 namespace {
 
-constexpr int kVirtualBackend = 0;
 constexpr int kFirstChannel = 1;
 constexpr const char *kEventName = "com.kelv.Event.Pcd.ManualTrigger";
 

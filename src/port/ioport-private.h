@@ -11,9 +11,6 @@
 #include "base/condition.h"
 #include "port/ioport.h"
 
-// Ports that exist in memory only: clients report their states, nothing drives them.
-inline constexpr int kVirtualBackend = 0;
-
 // One attribute of the backend's part of the hardware description.
 struct BackendProperty {
   std::string section;

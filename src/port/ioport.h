@@ -20,6 +20,9 @@
 #include "port/port-functions.h"
 #include "port/supervised-range.h"
 
+// The backend of ports that exist in memory only: clients report their states, nothing drives them.
+inline constexpr int kVirtualBackend = 0;
+
 enum PortType {
   PORT_INPUT = 0,
   PORT_OUTPUT = 1,
