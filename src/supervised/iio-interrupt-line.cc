@@ -280,14 +280,19 @@ void unwatch_events(IOPort *port, const IioIntSupervisedData &data) {
 }
 
 // Only a device that is there again is worth the messages of a set-up.
+bool reconnect(IOPort *port) {
+  const IioIntSupervisedData *data = iio_int_data(port);
+  if (iio_find_number(data->driver, IIO_KIND_DEVICE) < 0) {
+    return false;
+  }
+  unwatch_events(port, *data);
+  return connect(port);
+}
+
 gboolean recover(gpointer user_data) {
   auto *port = static_cast<IOPort *>(user_data);
   IioIntSupervisedData *data = iio_int_data(port);
-  if (iio_find_number(data->driver, IIO_KIND_DEVICE) < 0) {
-    return G_SOURCE_CONTINUE;
-  }
-  unwatch_events(port, *data);
-  if (!connect(port)) {
+  if (!reconnect(port)) {
     return G_SOURCE_CONTINUE;
   }
   data->lost = false;
@@ -334,15 +339,18 @@ bool iio_int_readout(IOPort *port, bool fresh, SupervisedRangeState *state, std:
 
 void iio_int_set_threshold_watch(IOPort *port, bool on) {
   IioIntSupervisedData *data = iio_int_data(port);
+  data->limit_timer.reset();
+  data->recovery.reset();
+  data->lost = false;
   if (!on) {
-    data->limit_timer.reset();
-    data->recovery.reset();
     disable(port);
     unwatch_events(port, *data);
     return;
   }
   data->last_state = SUPERVISED_STATE_UNDEFINED;
-  if (data->lost) {
+  // A device that fails tells its watched ports only.
+  const bool failed = !data->int_device || !data->int_device->events;
+  if (failed && !reconnect(port)) {
     look_for_device(port, data);
     return;
   }

@@ -270,6 +270,7 @@ void set_device_watch(IOPort *port, bool on) {
     data->device_watch.reset();
     data->device_check.reset();
     data->recovery.reset();
+    data->lost = false;
   } else if (!data->device_watch && !data->recovery) {
     data->last_state = SUPERVISED_STATE_UNDEFINED;
     if (data->fd) {

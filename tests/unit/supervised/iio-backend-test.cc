@@ -271,6 +271,16 @@ TEST_F(Iio, SupervisionMayBeSwitchedWhileTheDeviceIsLost) {
   EXPECT_EQ(readout(port), "closed 150");
 }
 
+TEST_F(Iio, WithoutSupervisionALossIsForgotten) {
+  const IOPortRef port = watched();
+  sample(150);
+  writer.reset();
+  iterate();
+  EXPECT_EQ(readout(port), "undefined 150");
+  EXPECT_TRUE(io_port_set_supervised(port.get(), false));
+  EXPECT_EQ(readout(port), "closed 150");
+}
+
 TEST_F(Iio, ADroppedPortHoldsNothingAndComesBackAgainAndAgain) {
   const IOPortRef port = make();
   EXPECT_TRUE(io_port_set_supervised_range(port.get(), "closed", 1, 2, nullptr));

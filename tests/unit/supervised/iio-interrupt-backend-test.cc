@@ -414,12 +414,47 @@ TEST_F(Interrupt, SupervisionMayBeSwitchedWhileTheDeviceIsLost) {
   const IOPortRef port = watched();
   writer.reset();
   iterate();
+  remove("sys/bus/iio/devices/iio:device6/name");
   EXPECT_TRUE(io_port_set_supervised(port.get(), false));
   EXPECT_EQ(timers(), std::vector<guint>{});
   EXPECT_TRUE(io_port_set_supervised(port.get(), true));
   EXPECT_EQ(timers(), (std::vector<guint>{kRecovery}));
+  EXPECT_EQ(readout(port), "undefined 150");
+  make_device(6, "comparator");
   expire(kRecovery);
   EXPECT_EQ(armed(), "200/100, enabled 1/1");
+}
+
+TEST_F(Interrupt, APortThatWasNotWatchedWhenItsDeviceFailedGetsEventsAgain) {
+  const IOPortRef first = watched();
+  const IOPortRef second = make({{"device", "channel", "1"}});
+  EXPECT_TRUE(io_port_setup(second.get()));
+  io_port_set_number(second.get(), 2);
+  EXPECT_EQ(::write(writer.get(), "short", 5), 5);
+  iterate();
+  reports();
+  EXPECT_TRUE(io_port_set_supervised(second.get(), true));
+  set_raw(250, 1);
+  send_events(1);
+  EXPECT_EQ(reports(), (Words{"2 off"}));
+  EXPECT_EQ(armed(1), "300/201, enabled 1/1");
+  expire(kRecovery);
+  EXPECT_EQ(readout(first), "closed 150");
+  EXPECT_EQ(descriptors("dev/iio:device6.events"), 2U);  // the test has one
+}
+
+TEST_F(Interrupt, WithoutSupervisionALossIsForgotten) {
+  const IOPortRef cached = watched();
+  const IOPortRef fresh = watched({{"device", "cache_ad_value", "false"}});
+  writer.reset();
+  iterate();
+  EXPECT_EQ(readout(cached), "undefined 150");
+  EXPECT_EQ(readout(fresh), "undefined 150");
+  EXPECT_TRUE(io_port_set_supervised(cached.get(), false));
+  EXPECT_TRUE(io_port_set_supervised(fresh.get(), false));
+  EXPECT_EQ(readout(cached), "closed 150");
+  set_raw(250);
+  EXPECT_EQ(readout(fresh), "open 250");
 }
 
 TEST_F(Interrupt, ReadoutsAreCachedUnlessTheDocumentSaysOtherwise) {
