@@ -42,7 +42,7 @@ struct IioIntSupervisedData : SupervisedData {
   ThresholdFiles files;
   IntDevicePtr int_device;
   std::atomic<std::int32_t> value = 0;  // last read; an action thread may read one too
-  bool lost = false;                    // the watch has lost the device and looks for it
+  std::atomic<bool> lost = false;       // the watch could not read it last
   Source limit_timer;
   Source recovery;
 };

@@ -213,6 +213,9 @@ void arm(IOPort *port) {
     look_for_device(port, data);
     return;
   }
+  // What was reported last is that the line could not be read.
+  const bool readable_again = data->lost.exchange(false);
+  data->recovery.reset();
   const SupervisedRange *range = find_range(ranges, data->value);
   if (!range || at_limit(*data, data->value)) {
     read_later(port, data);
@@ -220,39 +223,38 @@ void arm(IOPort *port) {
   }
   data->limit_timer.reset();
   apply_thresholds(&data->files, plan_thresholds(*range, data->rules));
-  if (must_look_again(data, *range)) {
+  if (readable_again || must_look_again(data, *range)) {
     read_later(port, data);
   }
 }
 
-// What the line is now; undefined, with an error, when it can't be read.
-SupervisedRangeState read_state(IOPort *port, GError **error) {
+// Reports what the line is now; undefined, with an error, when it can't be read. Whoever is told
+// may ask for a readout, which must not answer from an older value then.
+void report_line(IOPort *port, GError **error) {
   SupervisedRangeState state = SUPERVISED_STATE_UNDEFINED;
   std::uint32_t level = 0;
-  (void)iio_int_readout(port, true, &state, &level, error);
-  return state;
+  iio_int_data(port)->lost = !iio_int_readout(port, true, &state, &level, error);
+  supervised_report_state(port, state);
 }
 
 gboolean read_again(gpointer user_data) {
   auto *port = static_cast<IOPort *>(user_data);
   iio_int_data(port)->limit_timer.forget();
   Error error;
-  const SupervisedRangeState state = read_state(port, error.out());
+  report_line(port, error.out());
   if (error) {
     log_critical("Unable to read from port %s\n", io_port_get_name(port).value_or("").c_str());
   }
-  supervised_report_state(port, state);
   arm(port);
   return G_SOURCE_REMOVE;
 }
 
 void on_event(IOPort *port) {
   Error error;
-  const SupervisedRangeState state = read_state(port, error.out());
+  report_line(port, error.out());
   if (error) {
     log_critical("Readout failed: %s", error.message());
   }
-  supervised_report_state(port, state);
   arm(port);
 }
 
@@ -295,7 +297,6 @@ gboolean recover(gpointer user_data) {
   if (!reconnect(port)) {
     return G_SOURCE_CONTINUE;
   }
-  data->lost = false;
   data->recovery.forget();
   watch_events(port, *data);
   on_event(port);

@@ -41,7 +41,7 @@ struct IioSupervisedData : SupervisedData {
   UniqueFd fd;
   IioSampleType iio_type;
   std::uint32_t last_level = 0;
-  bool lost = false;  // the device failed; until its first sample after that
+  bool lost = false;  // the watch could not read a sample; until the next one
   Source device_watch;
   Source device_check;
   Source recovery;
@@ -171,7 +171,8 @@ bool iio_setup_line(IOPort *port) {
 
 enum class Read { sample, nothing, failed, gone };
 
-Read failed_read(int code, Read result, GError **error) {
+Read failed_read(IioSupervisedData *data, int code, Read result, GError **error) {
+  data->lost = true;
   const char *reason = g_strerror(code);
   log_critical("read Error: %s", reason);
   g_set_error_literal(error, io_supervised_error_quark(), IO_SUPERVISED_ERROR_GENERIC, reason);
@@ -185,10 +186,10 @@ Read read_sample(IioSupervisedData *data, GError **error) {
     return Read::nothing;
   }
   if (length <= 0) {
-    return failed_read(length == 0 ? ENODEV : errno, Read::gone, error);
+    return failed_read(data, length == 0 ? ENODEV : errno, Read::gone, error);
   }
   if (static_cast<std::size_t>(length) != data->iio_type.bytes) {
-    return failed_read(EIO, Read::failed, error);
+    return failed_read(data, EIO, Read::failed, error);
   }
   data->last_level = iio_decode_sample(data->iio_type, sample, data->shift);
   data->lost = false;
@@ -224,8 +225,9 @@ gboolean on_sample(gint /*fd*/, GIOCondition condition, gpointer user_data) {
   auto *port = static_cast<IOPort *>(user_data);
   IioSupervisedData *data = data_of(port);
   Error error;
-  const Read result = (condition & G_IO_IN) != 0 ? read_sample(data, error.out())
-                                                 : failed_read(ENODEV, Read::gone, error.out());
+  const Read result = (condition & G_IO_IN) != 0
+                          ? read_sample(data, error.out())
+                          : failed_read(data, ENODEV, Read::gone, error.out());
   if (result == Read::nothing) {
     return G_SOURCE_CONTINUE;
   }

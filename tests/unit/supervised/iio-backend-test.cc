@@ -220,6 +220,22 @@ TEST_F(Iio, AShortSampleReadsUndefinedAndTheNextOneCounts) {
   EXPECT_EQ(reports(), (Words{"1 on"}));
 }
 
+TEST_F(Iio, AnEventTellsThatASampleCouldNotBeRead) {
+  const IOPortRef port = watched();
+  add_supervised_event(port);
+  sample(150);
+  EXPECT_EQ(reports(), (Words{"event closed", "1 on"}));
+  EXPECT_EQ(::write(writer.get(), "x", 1), 1);
+  iterate();
+  EXPECT_EQ(reports(), (Words{"event undefined", "1 on"}));
+  EXPECT_EQ(readout(port), "undefined 150");
+  EXPECT_EQ(::write(writer.get(), "x", 1), 1);
+  iterate();
+  EXPECT_EQ(reports(), Words{});
+  sample(160);
+  EXPECT_EQ(reports(), (Words{"event closed", "1 on"}));
+}
+
 // The last writer of a FIFO going away looks as a device does that goes away: POLLHUP, end of file.
 TEST_F(Iio, ALostDeviceReadsUndefinedAndIsLookedForOnceASecond) {
   const IOPortRef port = watched();

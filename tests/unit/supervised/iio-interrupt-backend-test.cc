@@ -362,6 +362,47 @@ TEST_F(Interrupt, ARawValueThatCannotBeReadReadsUndefinedUntilItCan) {
   }
 }
 
+TEST_F(Interrupt, AnEventTellsThatTheLineCannotBeRead) {
+  const IOPortRef port = watched();
+  add_supervised_event(port);
+  send_events(0);
+  EXPECT_EQ(reports(), (Words{"event closed", "1 on"}));
+  remove(attribute(6, "in_voltage0_raw"));
+  send_events(0);
+  EXPECT_EQ(reports(), (Words{"event undefined", "1 on"}));
+  set_raw(150);
+  expire(kRecovery);
+  EXPECT_EQ(reports(), (Words{"event closed", "1 on"}));
+  EXPECT_EQ(timers(), std::vector<guint>{});
+}
+
+TEST_F(Interrupt, ALevelThatCouldNotBeReadForAMomentIsToldAgain) {
+  const IOPortRef port = watched();
+  add_supervised_event(port);
+  send_events(0);
+  reports();
+  texts_to_come({"nonsense\n"});
+  send_events(0);
+  EXPECT_EQ(reports(), (Words{"event undefined", "1 on"}));
+  EXPECT_EQ(armed(), "200/100, enabled 1/1");
+  EXPECT_EQ(readout(port), "closed 150");
+  expire(kLimit);
+  EXPECT_EQ(reports(), (Words{"event closed", "1 on"}));
+  EXPECT_EQ(timers(), std::vector<guint>{});
+}
+
+TEST_F(Interrupt, AnEventTellsThatALevelBeyondALimitCannotBeReadAnyMore) {
+  set_raw(110);
+  const IOPortRef port = watched({{"device", "lower_limit", "120"}});
+  add_supervised_event(port);
+  expire(kLimit);
+  EXPECT_EQ(reports(), (Words{"event closed", "1 on"}));
+  remove(attribute(6, "in_voltage0_raw"));
+  expire(kLimit);
+  EXPECT_EQ(reports(), (Words{"event undefined", "1 on"}));
+  EXPECT_TRUE(was_logged("critical: Unable to read from port Line\n"));
+}
+
 TEST_F(Interrupt, AShortRecordEndsTheWatchUntilTheDeviceIsOpenedAnew) {
   const IOPortRef port = watched();
   send_events(0);
