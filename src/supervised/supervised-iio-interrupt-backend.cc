@@ -21,6 +21,7 @@ bool iio_int_set_control_pins(IOPort *port) {
   ControlLevels levels = supervised_control_levels(port);
   if (iio_int_data(port)->pullup_when_supervised && io_port_direction_input(port)) {
     levels.io_ctrl = true;
+    levels.pull_up = true;
   }
   return supervised_drive_control_pins(port, levels);
 }

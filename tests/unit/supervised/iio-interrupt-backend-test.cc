@@ -642,6 +642,16 @@ TEST_F(Interrupt, APullUpMayStayOnWhileSupervised) {
   EXPECT_EQ(armed(), "200/100, enabled 1/1");
 }
 
+TEST_F(Interrupt, APullUpStaysOnWhenTheMeasuredPathCannotBeLeft) {
+  const IOPortRef port = make({{"device", "pullup_when_supervised", "true"}});
+  io_port_restore_supervised(port.get(), true);
+  EXPECT_TRUE(io_port_setup(port.get()));
+  break_line(3);
+  EXPECT_TRUE(io_port_set_supervised(port.get(), false));
+  EXPECT_TRUE(was_logged("critical: Failed to set sioctrl pin"));
+  EXPECT_TRUE(line(2) && line(3));
+}
+
 TEST_F(Interrupt, ADroppedPortHoldsNothingAndComesBackAgainAndAgain) {
   const IOPortRef port = make({{"device", "lower_limit", "120"}});
   io_port_restore_supervised(port.get(), true);
