@@ -47,13 +47,23 @@ std::optional<std::int32_t> parse_value(const std::string &text) {
   return static_cast<std::int32_t>(number);
 }
 
+void set_raw_path(IioIntSupervisedData *data, std::string path) {
+  const std::lock_guard lock(data->raw_path_lock);
+  data->raw_path.swap(path);
+}
+
+std::string get_raw_path(IioIntSupervisedData *data) {
+  const std::lock_guard lock(data->raw_path_lock);
+  return data->raw_path;
+}
+
 bool read_value(IioIntSupervisedData *data, GError **error) {
-  const std::string path = channel_prefix(*data, "") + "raw";
-  const auto text = sysfs_read(path);
+  const std::string path = get_raw_path(data);
+  const auto text = path.empty() ? std::nullopt : sysfs_read(path);
   const auto raw = text ? parse_value(*text) : std::nullopt;
   if (!raw) {
     g_set_error(error, io_supervised_error_quark(), IO_SUPERVISED_ERROR_GENERIC,
-                "Failed to read %s", path.c_str());
+                "Failed to read %s", path.empty() ? "the level: no device" : path.c_str());
     return false;
   }
   data->value = shift_value(*raw, data->rules.bitshift);
@@ -130,6 +140,7 @@ void open_attributes(IioIntSupervisedData *data, const IOPort *port) {
   if (!data->channel_name) {
     data->channel_name = "voltage" + std::to_string(data->channel);
   }
+  set_raw_path(data, channel_prefix(*data, "") + "raw");
   const std::string prefix = channel_prefix(*data, "events/");
   data->files = open_threshold_files(prefix);
   if (!data->files.rising_value && !data->files.falling_value) {

@@ -3,6 +3,7 @@
 #include <glib-unix.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <cerrno>
 #include <string>
 #include <string_view>
@@ -40,8 +41,9 @@ struct IioSupervisedData : SupervisedData {
   std::string dev_path;
   UniqueFd fd;
   IioSampleType iio_type;
-  std::uint32_t last_level = 0;
-  bool lost = false;  // the watch could not read a sample; until the next one
+  // Action threads ask for these, too.
+  std::atomic<std::uint32_t> last_level = 0;
+  std::atomic<bool> lost = false;  // the watch could not read a sample; until the next one
   Source device_watch;
   Source device_check;
   Source recovery;
@@ -196,13 +198,13 @@ Read read_sample(IioSupervisedData *data, GError **error) {
   return Read::sample;
 }
 
-// Answers from the last sample; before the first one the level is 0.
+// Answers from the last sample; before the first one the level is 0. Also from action threads.
 bool get_supervised_readout(IOPort *port, SupervisedRangeState *state, std::uint32_t *level,
                             GError **error) {
   const IioSupervisedData *data = data_of(port);
   *state = SUPERVISED_STATE_UNDEFINED;
   *level = data->last_level;
-  if (data->lost || !data->initialised) {
+  if (data->lost) {
     return true;
   }
   return supervised_classify_for_port(port, *level, state, error);

@@ -57,7 +57,7 @@ bool set_supervised_ranges(IOPort *port, SupervisedRanges ranges, GError **error
 bool get_supervised_readout(IOPort *port, SupervisedRangeState *state, std::uint32_t *level,
                             GError **error) {
   const IioIntSupervisedData *data = iio_int_data(port);
-  if (data->lost || !data->initialised) {
+  if (data->lost) {
     *state = SUPERVISED_STATE_UNDEFINED;
     *level = static_cast<std::uint32_t>(data->value.load());
     return true;

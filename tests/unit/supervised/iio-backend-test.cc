@@ -2,7 +2,9 @@
 #include <fcntl.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <filesystem>
+#include <thread>
 
 #include "base/unique-fd.h"
 #include "supervised/iio-sysfs.h"
@@ -166,8 +168,28 @@ TEST_F(Iio, AnOutputNeedsNoConverter) {
 TEST_F(Iio, BeforeTheFirstSampleTheLevelIsZero) {
   const IOPortRef port =
       make({{"range", "state", "short"}, {"range", "lower", "0"}, {"range", "upper", "5"}});
+  EXPECT_EQ(readout(port), "short 0");
   EXPECT_TRUE(io_port_setup(port.get()));
   EXPECT_EQ(readout(port), "short 0");
+}
+
+TEST_F(Iio, ActionThreadsMayAskWhileSamplesCome) {
+  const IOPortRef port = watched();
+  sample(150);
+  std::atomic<bool> done = false;
+  std::thread reader([&] {
+    while (!done) {
+      const std::string now = readout(port);
+      EXPECT_TRUE(now == "closed 150" || now == "undefined 150") << now;
+    }
+  });
+  for (int round = 0; round < 200; ++round) {
+    EXPECT_EQ(::write(writer.get(), "x", 1), 1);
+    iterate();
+    sample(150);
+  }
+  done = true;
+  reader.join();
 }
 
 TEST_F(Iio, ChangesOfTheSampledStateAreReported) {

@@ -4,6 +4,9 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <atomic>
+#include <thread>
+
 #include "base/glib-ptr.h"
 #include "base/unique-fd.h"
 #include "supervised/iio-thresholds.h"
@@ -604,6 +607,39 @@ TEST_F(Interrupt, APortWithNothingButAPinIsRefusedAndHarmless) {
   EXPECT_TRUE(io_port_set_supervised(port.get(), true));
   io_port_set_watch(port.get());
   EXPECT_EQ(timers(), std::vector<guint>{});
+}
+
+TEST_F(Interrupt, BeforeAnythingIsReadTheLevelIsZero) {
+  const Property device = {"device", "driver", "unknown"};
+  for (const bool set_up : {false, true}) {
+    const IOPortRef port = set_up ? make() : make({device});
+    EXPECT_EQ(io_port_setup(port.get()), set_up);
+    EXPECT_TRUE(io_port_set_supervised_range(port.get(), "short", 0, 5, nullptr));
+    EXPECT_EQ(readout(port), "short 0");
+  }
+  const IOPortRef fresh = make({device, {"device", "cache_ad_value", "false"}});
+  EXPECT_FALSE(io_port_setup(fresh.get()));
+  EXPECT_EQ(readout(fresh), "error 0: Failed to read the level: no device");
+}
+
+TEST_F(Interrupt, ActionThreadsMayReadWhileTheDeviceIsFoundAnew) {
+  const IOPortRef port = watched();
+  std::atomic<bool> done = false;
+  std::thread reader([&] {
+    while (!done) {
+      EXPECT_TRUE(io_port_get_state(port.get()));
+      const std::string now = readout(port);
+      EXPECT_TRUE(now == "closed 150" || now == "undefined 150") << now;
+    }
+  });
+  for (int round = 0; round < 20; ++round) {
+    EXPECT_EQ(::write(writer.get(), "short", 5), 5);
+    iterate();
+    expire(kRecovery);
+  }
+  done = true;
+  reader.join();
+  EXPECT_EQ(readout(port), "closed 150");
 }
 
 TEST_F(Interrupt, AnOutputNeedsNoConverter) {
