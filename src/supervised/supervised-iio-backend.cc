@@ -28,7 +28,6 @@ constexpr const char *kTimerTriggers = "/sys/kernel/config/iio/triggers/hrtimer/
 constexpr int kFolderMode = 0775;
 constexpr guint kRecoveryInterval = 1000;  // milliseconds between two looks for a lost device
 constexpr guint kCheckInterval = 1;        // seconds between two looks whether it is lost
-constexpr int kDecimal = 10;
 
 struct IioSupervisedData : SupervisedData {
   std::string name;     // of the device whose buffer is read
@@ -56,10 +55,7 @@ IioSupervisedData *data_of(IOPort *port) {
 }
 
 bool iio_set_control_pins(IOPort *port) {
-  if (io_port_get_type(port) == PORT_OUTPUT) {
-    g_assertion_message_expr(G_LOG_DOMAIN, __FILE__, __LINE__, __func__,
-                             "port->type == PORT_INPUT");
-  }
+  supervised_demand_input(port);
   return supervised_drive_control_pins(port, supervised_control_levels(port));
 }
 
@@ -310,10 +306,6 @@ void set_direction(IOPort *port, bool input) {
   (void)supervised_turn(port, input, kParts);
 }
 
-int parse_decimal(const char *text) {
-  return static_cast<int>(static_cast<guint32>(g_ascii_strtoll(text, nullptr, kDecimal)));
-}
-
 void set_device_property(IioSupervisedData *data, std::string_view key, const char *value) {
   if (key == "name") {
     data->name = value;
@@ -324,9 +316,9 @@ void set_device_property(IioSupervisedData *data, std::string_view key, const ch
   } else if (key == "freq") {
     data->freq = value;
   } else if (key == "shift") {
-    data->shift = parse_decimal(value);
+    data->shift = property_signed(value);
   } else if (key == "channel") {
-    data->channel = parse_decimal(value);
+    data->channel = property_signed(value);
   }
 }
 

@@ -14,10 +14,7 @@ namespace {
 
 // On some boards the plain path's pull-up is what feeds the measured line.
 bool iio_int_set_control_pins(IOPort *port) {
-  if (io_port_get_type(port) == PORT_OUTPUT) {
-    g_assertion_message_expr(G_LOG_DOMAIN, __FILE__, __LINE__, __func__,
-                             "port->type == PORT_INPUT");
-  }
+  supervised_demand_input(port);
   ControlLevels levels = supervised_control_levels(port);
   if (iio_int_data(port)->pullup_when_supervised && io_port_direction_input(port)) {
     levels.io_ctrl = true;

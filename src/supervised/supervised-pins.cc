@@ -149,6 +149,12 @@ bool supervised_drive_control_pins(IOPort *port, ControlLevels levels) {
   return false;
 }
 
+void supervised_demand_input(IOPort *port, const char *file, int line, const char *function) {
+  if (io_port_get_type(port) == PORT_OUTPUT) {
+    g_assertion_message_expr(G_LOG_DOMAIN, file, line, function, "port->type == PORT_INPUT");
+  }
+}
+
 ControlLevels supervised_control_levels(IOPort *port) {
   if (!io_port_direction_input(port)) {
     return {.io_ctrl = false, .sio_ctrl = false};

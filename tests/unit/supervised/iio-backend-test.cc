@@ -362,7 +362,7 @@ TEST_F(IioDeath, TheControlPinsOfAnOutputAreAProgrammingError) {
         io_port_set_type(port.get(), PORT_OUTPUT);
         supervised_iio_backend_functions(port.get())->set_direction(port.get(), true);
       },
-      "iio_set_control_pins.*port->type == PORT_INPUT");
+      "supervised-iio-backend.*iio_set_control_pins.*port->type == PORT_INPUT");
 }
 
 TEST_F(Iio, OnlyTwoKindsOfEntriesAreKnown) {

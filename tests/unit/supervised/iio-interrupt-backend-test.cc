@@ -718,7 +718,7 @@ TEST_F(Interrupt, TheControlPinsOfAnOutputAreAProgrammingError) {
         io_port_set_type(port.get(), PORT_OUTPUT);
         supervised_iio_interrupt_backend_functions(port.get())->set_direction(port.get(), true);
       },
-      "iio_int_set_control_pins.*port->type == PORT_INPUT");
+      "supervised-iio-interrupt-backend.*iio_int_set_control_pins.*port->type == PORT_INPUT");
 }
 
 }  // namespace
