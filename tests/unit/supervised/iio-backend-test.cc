@@ -292,6 +292,46 @@ TEST_F(Iio, ALostDeviceReadsUndefinedAndIsLookedForOnceASecond) {
   EXPECT_EQ(readout(port), "closed 150");
 }
 
+// A folder can be opened and gives a read error.
+TEST_F(Iio, ADeviceThatCannotBeReadIsLostUntilItCan) {
+  remove("dev/iio:device2");
+  std::filesystem::create_directories(path("dev/iio:device2"));
+  const IOPortRef port = make();
+  io_port_restore_supervised(port.get(), true);
+  EXPECT_TRUE(io_port_setup(port.get()));
+  io_port_set_watch(port.get());
+  iterate();
+  EXPECT_TRUE(was_logged("critical: read Error: Is a directory"));
+  EXPECT_TRUE(was_logged("critical: Readout failed: Is a directory"));
+  EXPECT_EQ(readout(port), "undefined 0");
+  EXPECT_EQ(descriptors("dev/iio:device2"), 0U);
+  EXPECT_EQ(timers(), (std::vector<guint>{kRecovery}));
+  EXPECT_FALSE(g_main_context_iteration(nullptr, FALSE));
+
+  remove("dev/iio:device2");
+  make_node(2);
+  expire(kRecovery);
+  writer.reset(open_node(2));
+  sample(150);
+  EXPECT_EQ(readout(port), "closed 150");
+}
+
+TEST_F(Iio, ADeviceWhoseSamplesEndIsLost) {
+  remove("dev/iio:device2");
+  write("dev/iio:device2", std::string_view("\x96\0", 2));
+  const IOPortRef port = make();
+  add_supervised_event(port);
+  io_port_restore_supervised(port.get(), true);
+  EXPECT_TRUE(io_port_setup(port.get()));
+  io_port_set_watch(port.get());
+  iterate();
+  EXPECT_EQ(reports(), (Words{"event closed", "1 on", "event undefined", "1 on"}));
+  EXPECT_TRUE(was_logged("critical: read Error: No such device"));
+  EXPECT_EQ(readout(port), "undefined 150");
+  EXPECT_EQ(timers(), (std::vector<guint>{kRecovery}));
+  EXPECT_FALSE(g_main_context_iteration(nullptr, FALSE));
+}
+
 TEST_F(Iio, SupervisionMayBeSwitchedWhileTheDeviceIsLost) {
   const IOPortRef port = watched();
   writer.reset();

@@ -157,6 +157,32 @@ TEST_F(Interrupt, WithOneThresholdOnlyItsSideIsEnabled) {
   EXPECT_EQ(armed(), "1/100, enabled 0/0");
 }
 
+TEST_F(Interrupt, WithOneThresholdARangeFromZeroIsLeftAtItsUpperEnd) {
+  set_raw(50);
+  const IOPortRef port = watched({{"device", "one_threshold", "true"},
+                                  {"device", "hysteresis", "5"},
+                                  {"range", "state", "short"},
+                                  {"range", "lower", "0"},
+                                  {"range", "upper", "99"}});
+  EXPECT_EQ(armed(), "104/0, enabled 1/0");
+  set_raw(150);
+  send_events(0);
+  EXPECT_EQ(armed(), "104/95, enabled 0/1");
+  EXPECT_TRUE(io_port_set_supervised(port.get(), false));
+  EXPECT_EQ(armed(), "104/95, enabled 0/0");
+}
+
+TEST_F(Interrupt, OneThresholdMayBeEnabledByTheFileForBothSides) {
+  write(attribute(6, "events/in_voltage0_thresh_either_en"), "");
+  remove(attribute(6, "events/in_voltage0_thresh_rising_en"));
+  remove(attribute(6, "events/in_voltage0_thresh_falling_en"));
+  const IOPortRef port = watched({{"device", "one_threshold", "true"}});
+  EXPECT_EQ(event_file("falling_value"), "100");
+  EXPECT_EQ(event_file("either_en"), "1");
+  EXPECT_TRUE(io_port_set_supervised(port.get(), false));
+  EXPECT_EQ(event_file("either_en"), "0");
+}
+
 TEST_F(Interrupt, ChannelsMayHaveNamesOfTheirOwn) {
   write(attribute(6, "in_proximity7_loop_raw"), "42\n");
   write(attribute(6, "events/in_proximity7_loop_thresh_rising_value"), "");
@@ -251,10 +277,11 @@ TEST_F(Interrupt, PortsOfTheSameChannelOnTwoDevicesAreBothArmedAgain) {
 }
 
 TEST_F(Interrupt, BeyondALimitTheLevelIsReadAgainAfterAWhile) {
-  set_raw(40);
+  set_raw(105);
   const IOPortRef port = watched({{"device", "lower_limit", "110"},
                                   {"device", "upper_limit", "280"},
                                   {"device", "limit_timeout", "70"}});
+  EXPECT_EQ(armed(), "1/0, enabled 0/0");
   EXPECT_EQ(timers(), (std::vector<guint>{70}));
   for (const int at_limit : {110, 105, 280, 290}) {
     set_raw(at_limit);
