@@ -16,6 +16,7 @@ struct GpioPin {
   std::optional<std::string> alias;  // the line's name; when set, it is requested by that
   std::int32_t pin = 0;              // the line's number
   ugpio_t *handle = nullptr;         // none while the line is not requested
+  bool driven_high = false;          // for backends that have to know what they last wrote
 };
 
 // Requests and opens the line and sets its active-low sense; what an earlier request left is given

@@ -2,6 +2,7 @@
 #pragma once
 
 #include <atomic>
+#include <mutex>
 #include <optional>
 #include <string>
 
@@ -41,8 +42,12 @@ struct IioIntSupervisedData : SupervisedData {
   int device = -1;
   ThresholdFiles files;
   IntDevicePtr int_device;
+  // What an action thread reads the level by, while the main thread may find the device elsewhere.
+  // Nothing else is locked while the lock is held.
+  std::mutex raw_path_lock;
+  std::string raw_path;                 // none before the first set-up
   std::atomic<std::int32_t> value = 0;  // last read; an action thread may read one too
-  bool lost = false;                    // the device has failed and is looked for
+  std::atomic<bool> lost = false;       // the watch could not read it last
   Source limit_timer;
   Source recovery;
 };

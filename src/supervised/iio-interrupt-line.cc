@@ -47,13 +47,23 @@ std::optional<std::int32_t> parse_value(const std::string &text) {
   return static_cast<std::int32_t>(number);
 }
 
+void set_raw_path(IioIntSupervisedData *data, std::string path) {
+  const std::lock_guard lock(data->raw_path_lock);
+  data->raw_path.swap(path);
+}
+
+std::string get_raw_path(IioIntSupervisedData *data) {
+  const std::lock_guard lock(data->raw_path_lock);
+  return data->raw_path;
+}
+
 bool read_value(IioIntSupervisedData *data, GError **error) {
-  const std::string path = channel_prefix(*data, "") + "raw";
-  const auto text = sysfs_read(path);
+  const std::string path = get_raw_path(data);
+  const auto text = path.empty() ? std::nullopt : sysfs_read(path);
   const auto raw = text ? parse_value(*text) : std::nullopt;
   if (!raw) {
     g_set_error(error, io_supervised_error_quark(), IO_SUPERVISED_ERROR_GENERIC,
-                "Failed to read %s", path.c_str());
+                "Failed to read %s", path.empty() ? "the level: no device" : path.c_str());
     return false;
   }
   data->value = shift_value(*raw, data->rules.bitshift);
@@ -130,6 +140,7 @@ void open_attributes(IioIntSupervisedData *data, const IOPort *port) {
   if (!data->channel_name) {
     data->channel_name = "voltage" + std::to_string(data->channel);
   }
+  set_raw_path(data, channel_prefix(*data, "") + "raw");
   const std::string prefix = channel_prefix(*data, "events/");
   data->files = open_threshold_files(prefix);
   if (!data->files.rising_value && !data->files.falling_value) {
@@ -213,6 +224,9 @@ void arm(IOPort *port) {
     look_for_device(port, data);
     return;
   }
+  // What was reported last is that the line could not be read.
+  const bool readable_again = data->lost.exchange(false);
+  data->recovery.reset();
   const SupervisedRange *range = find_range(ranges, data->value);
   if (!range || at_limit(*data, data->value)) {
     read_later(port, data);
@@ -220,39 +234,38 @@ void arm(IOPort *port) {
   }
   data->limit_timer.reset();
   apply_thresholds(&data->files, plan_thresholds(*range, data->rules));
-  if (must_look_again(data, *range)) {
+  if (readable_again || must_look_again(data, *range)) {
     read_later(port, data);
   }
 }
 
-// What the line is now; undefined, with an error, when it can't be read.
-SupervisedRangeState read_state(IOPort *port, GError **error) {
+// Reports what the line is now; undefined, with an error, when it can't be read. Whoever is told
+// may ask for a readout, which must not answer from an older value then.
+void report_line(IOPort *port, GError **error) {
   SupervisedRangeState state = SUPERVISED_STATE_UNDEFINED;
   std::uint32_t level = 0;
-  (void)iio_int_readout(port, true, &state, &level, error);
-  return state;
+  iio_int_data(port)->lost = !iio_int_readout(port, true, &state, &level, error);
+  supervised_report_state(port, state);
 }
 
 gboolean read_again(gpointer user_data) {
   auto *port = static_cast<IOPort *>(user_data);
   iio_int_data(port)->limit_timer.forget();
   Error error;
-  const SupervisedRangeState state = read_state(port, error.out());
+  report_line(port, error.out());
   if (error) {
     log_critical("Unable to read from port %s\n", io_port_get_name(port).value_or("").c_str());
   }
-  supervised_report_state(port, state);
   arm(port);
   return G_SOURCE_REMOVE;
 }
 
 void on_event(IOPort *port) {
   Error error;
-  const SupervisedRangeState state = read_state(port, error.out());
+  report_line(port, error.out());
   if (error) {
     log_critical("Readout failed: %s", error.message());
   }
-  supervised_report_state(port, state);
   arm(port);
 }
 
@@ -280,17 +293,21 @@ void unwatch_events(IOPort *port, const IioIntSupervisedData &data) {
 }
 
 // Only a device that is there again is worth the messages of a set-up.
+bool reconnect(IOPort *port) {
+  const IioIntSupervisedData *data = iio_int_data(port);
+  if (iio_find_number(data->driver, IIO_KIND_DEVICE) < 0) {
+    return false;
+  }
+  unwatch_events(port, *data);
+  return connect(port);
+}
+
 gboolean recover(gpointer user_data) {
   auto *port = static_cast<IOPort *>(user_data);
   IioIntSupervisedData *data = iio_int_data(port);
-  if (iio_find_number(data->driver, IIO_KIND_DEVICE) < 0) {
+  if (!reconnect(port)) {
     return G_SOURCE_CONTINUE;
   }
-  unwatch_events(port, *data);
-  if (!connect(port)) {
-    return G_SOURCE_CONTINUE;
-  }
-  data->lost = false;
   data->recovery.forget();
   watch_events(port, *data);
   on_event(port);
@@ -334,15 +351,18 @@ bool iio_int_readout(IOPort *port, bool fresh, SupervisedRangeState *state, std:
 
 void iio_int_set_threshold_watch(IOPort *port, bool on) {
   IioIntSupervisedData *data = iio_int_data(port);
+  data->limit_timer.reset();
+  data->recovery.reset();
+  data->lost = false;
   if (!on) {
-    data->limit_timer.reset();
-    data->recovery.reset();
     disable(port);
     unwatch_events(port, *data);
     return;
   }
   data->last_state = SUPERVISED_STATE_UNDEFINED;
-  if (data->lost) {
+  // A device that fails tells its watched ports only.
+  const bool failed = !data->int_device || !data->int_device->events;
+  if (failed && !reconnect(port)) {
     look_for_device(port, data);
     return;
   }

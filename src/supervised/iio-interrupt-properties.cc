@@ -8,19 +8,7 @@
 
 namespace {
 
-constexpr int kDecimal = 10;
-
 PendingRange pending_range;
-
-// More than 32 bits wrap; not a number reads as 0.
-std::uint32_t parse_unsigned(const char *text) {
-  return static_cast<std::uint32_t>(g_ascii_strtoull(text, nullptr, kDecimal));
-}
-
-std::int32_t parse_signed(const char *text) {
-  return static_cast<std::int32_t>(
-      static_cast<std::uint32_t>(g_ascii_strtoll(text, nullptr, kDecimal)));
-}
 
 // In adc mode the ranges stay out of the port and are taken as they come.
 void apply_range(IioIntSupervisedData *data, IOPort *port, const char *key, const char *value) {
@@ -54,19 +42,19 @@ bool apply_text(IioIntSupervisedData *data, std::string_view key, const char *va
 
 bool apply_number(IioIntSupervisedData *data, std::string_view key, const char *value) {
   if (key == "channel") {
-    data->channel = parse_unsigned(value);
+    data->channel = property_unsigned(value);
   } else if (key == "hysteresis") {
-    data->rules.hysteresis = parse_unsigned(value);
+    data->rules.hysteresis = property_unsigned(value);
   } else if (key == "lower_limit") {
-    data->lower_limit = parse_signed(value);
+    data->lower_limit = property_signed(value);
   } else if (key == "upper_limit") {
-    data->upper_limit = parse_signed(value);
+    data->upper_limit = property_signed(value);
   } else if (key == "limit_timeout") {
-    data->limit_timeout = parse_unsigned(value);
+    data->limit_timeout = property_unsigned(value);
   } else if (key == "bitshift") {
-    data->rules.bitshift = parse_signed(value);
+    data->rules.bitshift = property_signed(value);
   } else if (key == "integration_time") {
-    data->integration_time = parse_signed(value);
+    data->integration_time = property_signed(value);
   } else {
     return false;
   }

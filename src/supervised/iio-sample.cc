@@ -32,11 +32,14 @@ std::uint32_t take_significant(const IioSampleType &type, std::uint32_t value) {
 }  // namespace
 
 std::optional<IioSampleType> iio_parse_sample_type(const std::string &text) {
-  constexpr int fields = 5;
+  constexpr int all_but_shift = 4;
   IioSampleType type;
-  if (std::sscanf(text.c_str(), "%ce:%c%u/%u>>%u", &type.endian, &type.sign, &type.bits, &type.size,
-                  &type.shift) != fields ||
-      type.size == 0) {
+  const int fields = std::sscanf(text.c_str(), "%ce:%c%u/%u>>%u", &type.endian, &type.sign,
+                                 &type.bits, &type.size, &type.shift);
+  // A text that ends before the size describes no sample, and one that takes up no space could not
+  // be told from the end of the file. Neither is worth the daemon's end, as an unusable converter
+  // is.
+  if (fields < all_but_shift || type.size == 0) {
     return std::nullopt;
   }
   type.bytes = type.size / kBitsPerByte;

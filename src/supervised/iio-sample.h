@@ -19,7 +19,8 @@ struct IioSampleType {
 inline constexpr std::size_t kIioSampleBytes = 4;
 using IioSample = std::array<std::uint8_t, kIioSampleBytes>;
 
-// Reads "le:u12/16>>4". Nothing unless all of it is there and a sample takes up space.
+// Reads "le:u12/16>>4"; without the shift at the end it is 0. Nothing for a text of another form,
+// and unless a sample takes up space.
 std::optional<IioSampleType> iio_parse_sample_type(const std::string &text);
 
 // `value` shifted to the right. Distances come from documents and from the kernel: below 0 counts

@@ -1,8 +1,8 @@
 // The event descriptors of converters that raise threshold events. The kernel gives out one for
 // each device, so the ports on a device share it.
 //
-// The list of devices and of watched ports has a lock of its own, which is never held while a port
-// is called. Main thread.
+// The list of devices and of watched ports has a lock of its own. It is held while ports are told
+// to disable their events, and released before they are told anything else. Main thread.
 #pragma once
 
 #include <cstdint>

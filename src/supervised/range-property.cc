@@ -9,12 +9,15 @@ namespace {
 
 constexpr int kDecimal = 10;
 
-// More than 32 bits wrap; not a number reads as 0.
-std::uint32_t parse_limit(const char *text) {
+}  // namespace
+
+std::uint32_t property_unsigned(const char *text) {
   return static_cast<std::uint32_t>(g_ascii_strtoull(text, nullptr, kDecimal));
 }
 
-}  // namespace
+std::int32_t property_signed(const char *text) {
+  return static_cast<std::int32_t>(g_ascii_strtoll(text, nullptr, kDecimal));
+}
 
 std::optional<std::uint32_t> pending_range_take(PendingRange *pending, const char *key,
                                                 const char *value) {
@@ -22,9 +25,9 @@ std::optional<std::uint32_t> pending_range_take(PendingRange *pending, const cha
   if (name == "state") {
     pending->state = value;
   } else if (name == "lower") {
-    pending->lower = parse_limit(value);
+    pending->lower = property_unsigned(value);
   } else if (name == "upper") {
-    return parse_limit(value);
+    return property_unsigned(value);
   }
   return std::nullopt;
 }

@@ -1,4 +1,4 @@
-// The "range" element of the hardware description: its attributes arrive one by one.
+// Numbers of the hardware description, and its "range" element, whose attributes arrive one by one.
 #pragma once
 
 #include <cstdint>
@@ -6,6 +6,10 @@
 #include <string>
 
 #include "port/ioport.h"
+
+// Decimal. More than 32 bits wrap; not a number reads as 0.
+std::uint32_t property_unsigned(const char *text);
+std::int32_t property_signed(const char *text);
 
 // The range that an element is at describing. A backend has one for all its ports, so an element
 // has to give its state and its lower limit before the upper limit, which completes it.

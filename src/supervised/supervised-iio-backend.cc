@@ -3,6 +3,7 @@
 #include <glib-unix.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <cerrno>
 #include <string>
 #include <string_view>
@@ -27,7 +28,6 @@ constexpr const char *kTimerTriggers = "/sys/kernel/config/iio/triggers/hrtimer/
 constexpr int kFolderMode = 0775;
 constexpr guint kRecoveryInterval = 1000;  // milliseconds between two looks for a lost device
 constexpr guint kCheckInterval = 1;        // seconds between two looks whether it is lost
-constexpr int kDecimal = 10;
 
 struct IioSupervisedData : SupervisedData {
   std::string name;     // of the device whose buffer is read
@@ -40,8 +40,9 @@ struct IioSupervisedData : SupervisedData {
   std::string dev_path;
   UniqueFd fd;
   IioSampleType iio_type;
-  std::uint32_t last_level = 0;
-  bool lost = false;  // the device failed; until its first sample after that
+  // Action threads ask for these, too.
+  std::atomic<std::uint32_t> last_level = 0;
+  std::atomic<bool> lost = false;  // the watch could not read a sample; until the next one
   Source device_watch;
   Source device_check;
   Source recovery;
@@ -54,10 +55,7 @@ IioSupervisedData *data_of(IOPort *port) {
 }
 
 bool iio_set_control_pins(IOPort *port) {
-  if (io_port_get_type(port) == PORT_OUTPUT) {
-    g_assertion_message_expr(G_LOG_DOMAIN, __FILE__, __LINE__, __func__,
-                             "port->type == PORT_INPUT");
-  }
+  supervised_demand_input(port);
   return supervised_drive_control_pins(port, supervised_control_levels(port));
 }
 
@@ -171,7 +169,8 @@ bool iio_setup_line(IOPort *port) {
 
 enum class Read { sample, nothing, failed, gone };
 
-Read failed_read(int code, Read result, GError **error) {
+Read failed_read(IioSupervisedData *data, int code, Read result, GError **error) {
+  data->lost = true;
   const char *reason = g_strerror(code);
   log_critical("read Error: %s", reason);
   g_set_error_literal(error, io_supervised_error_quark(), IO_SUPERVISED_ERROR_GENERIC, reason);
@@ -185,23 +184,23 @@ Read read_sample(IioSupervisedData *data, GError **error) {
     return Read::nothing;
   }
   if (length <= 0) {
-    return failed_read(length == 0 ? ENODEV : errno, Read::gone, error);
+    return failed_read(data, length == 0 ? ENODEV : errno, Read::gone, error);
   }
   if (static_cast<std::size_t>(length) != data->iio_type.bytes) {
-    return failed_read(EIO, Read::failed, error);
+    return failed_read(data, EIO, Read::failed, error);
   }
   data->last_level = iio_decode_sample(data->iio_type, sample, data->shift);
   data->lost = false;
   return Read::sample;
 }
 
-// Answers from the last sample; before the first one the level is 0.
+// Answers from the last sample; before the first one the level is 0. Also from action threads.
 bool get_supervised_readout(IOPort *port, SupervisedRangeState *state, std::uint32_t *level,
                             GError **error) {
   const IioSupervisedData *data = data_of(port);
   *state = SUPERVISED_STATE_UNDEFINED;
   *level = data->last_level;
-  if (data->lost || !data->initialised) {
+  if (data->lost) {
     return true;
   }
   return supervised_classify_for_port(port, *level, state, error);
@@ -224,8 +223,9 @@ gboolean on_sample(gint /*fd*/, GIOCondition condition, gpointer user_data) {
   auto *port = static_cast<IOPort *>(user_data);
   IioSupervisedData *data = data_of(port);
   Error error;
-  const Read result = (condition & G_IO_IN) != 0 ? read_sample(data, error.out())
-                                                 : failed_read(ENODEV, Read::gone, error.out());
+  const Read result = (condition & G_IO_IN) != 0
+                          ? read_sample(data, error.out())
+                          : failed_read(data, ENODEV, Read::gone, error.out());
   if (result == Read::nothing) {
     return G_SOURCE_CONTINUE;
   }
@@ -270,6 +270,7 @@ void set_device_watch(IOPort *port, bool on) {
     data->device_watch.reset();
     data->device_check.reset();
     data->recovery.reset();
+    data->lost = false;
   } else if (!data->device_watch && !data->recovery) {
     data->last_state = SUPERVISED_STATE_UNDEFINED;
     if (data->fd) {
@@ -305,10 +306,6 @@ void set_direction(IOPort *port, bool input) {
   (void)supervised_turn(port, input, kParts);
 }
 
-int parse_decimal(const char *text) {
-  return static_cast<int>(static_cast<guint32>(g_ascii_strtoll(text, nullptr, kDecimal)));
-}
-
 void set_device_property(IioSupervisedData *data, std::string_view key, const char *value) {
   if (key == "name") {
     data->name = value;
@@ -319,9 +316,9 @@ void set_device_property(IioSupervisedData *data, std::string_view key, const ch
   } else if (key == "freq") {
     data->freq = value;
   } else if (key == "shift") {
-    data->shift = parse_decimal(value);
+    data->shift = property_signed(value);
   } else if (key == "channel") {
-    data->channel = parse_decimal(value);
+    data->channel = property_signed(value);
   }
 }
 

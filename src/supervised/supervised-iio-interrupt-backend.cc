@@ -14,13 +14,11 @@ namespace {
 
 // On some boards the plain path's pull-up is what feeds the measured line.
 bool iio_int_set_control_pins(IOPort *port) {
-  if (io_port_get_type(port) == PORT_OUTPUT) {
-    g_assertion_message_expr(G_LOG_DOMAIN, __FILE__, __LINE__, __func__,
-                             "port->type == PORT_INPUT");
-  }
+  supervised_demand_input(port);
   ControlLevels levels = supervised_control_levels(port);
   if (iio_int_data(port)->pullup_when_supervised && io_port_direction_input(port)) {
     levels.io_ctrl = true;
+    levels.pull_up = true;
   }
   return supervised_drive_control_pins(port, levels);
 }
@@ -56,7 +54,7 @@ bool set_supervised_ranges(IOPort *port, SupervisedRanges ranges, GError **error
 bool get_supervised_readout(IOPort *port, SupervisedRangeState *state, std::uint32_t *level,
                             GError **error) {
   const IioIntSupervisedData *data = iio_int_data(port);
-  if (data->lost || !data->initialised) {
+  if (data->lost) {
     *state = SUPERVISED_STATE_UNDEFINED;
     *level = static_cast<std::uint32_t>(data->value.load());
     return true;

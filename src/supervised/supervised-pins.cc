@@ -55,8 +55,22 @@ bool request_sio_ctrl(GpioPin &pin) {
 }
 
 // A board may lack a pin; there is nothing to drive then.
-bool drive(const GpioPinPtr &pin, int level) {
-  return !pin || libugpio_set_gpio_pin(pin.get(), level);
+bool drive(const GpioPinPtr &pin, bool level) {
+  if (!pin) {
+    return true;
+  }
+  if (!libugpio_set_gpio_pin(pin.get(), level ? 1 : 0)) {
+    return false;
+  }
+  pin->driven_high = level;
+  return true;
+}
+
+// Whether the pins would do for the role that `levels` are meant for when sio_ctrl stays as it is.
+// An output has to leave the plain path in any case; an input needs one path, and not both.
+bool fits(const ControlLevels &levels, bool sio_ctrl) {
+  const bool output = !levels.io_ctrl && !levels.sio_ctrl;
+  return output || levels.io_ctrl != sio_ctrl || (sio_ctrl && levels.pull_up);
 }
 
 bool has_output_side(IOPort *port) {
@@ -104,7 +118,6 @@ void supervised_request_pins(IOPort *port, bool initial_level) {
 bool supervised_request_control_pins(IOPort *port, bool sio_ctrl_optional) {
   SupervisedData *data = supervised_data(port);
   const bool input = io_port_input(port);
-  data->io_ctrl_level = input ? 1 : 0;
   if (data->io_ctrl) {
     request_pin(data->io_ctrl, false, input);
   } else {
@@ -122,21 +135,24 @@ bool supervised_request_control_pins(IOPort *port, bool sio_ctrl_optional) {
 bool supervised_drive_control_pins(IOPort *port, ControlLevels levels) {
   SupervisedData *data = supervised_data(port);
   const std::lock_guard guard(data->pins_lock);
-  const int before = data->io_ctrl_level;
-  const int io_ctrl = levels.io_ctrl ? 1 : 0;
-  if (!drive(data->io_ctrl, io_ctrl)) {
+  if (!drive(data->io_ctrl, levels.io_ctrl)) {
     log_critical("Failed to set ioctrl pin");
     return false;
   }
-  data->io_ctrl_level = io_ctrl;
-  if (drive(data->sio_ctrl, levels.sio_ctrl ? 1 : 0)) {
+  if (drive(data->sio_ctrl, levels.sio_ctrl)) {
     return true;
   }
   log_critical("Failed to set sioctrl pin");
-  if (before >= 0 && before != io_ctrl && drive(data->io_ctrl, before)) {
-    data->io_ctrl_level = before;
+  if (!fits(levels, data->sio_ctrl->driven_high)) {
+    (void)drive(data->io_ctrl, !levels.io_ctrl);
   }
   return false;
+}
+
+void supervised_demand_input(IOPort *port, const char *file, int line, const char *function) {
+  if (io_port_get_type(port) == PORT_OUTPUT) {
+    g_assertion_message_expr(G_LOG_DOMAIN, file, line, function, "port->type == PORT_INPUT");
+  }
 }
 
 ControlLevels supervised_control_levels(IOPort *port) {

@@ -25,10 +25,16 @@ bool supervised_request_control_pins(IOPort *port, bool sio_ctrl_optional);
 struct ControlLevels {
   bool io_ctrl;
   bool sio_ctrl;
+  bool pull_up = false;  // io_ctrl may be on as well while the line goes to the converter
 };
-// Drives io_ctrl, then sio_ctrl. False, with a message, when one of them refuses; the first is then
-// put back, so that the two never end up on at once.
+// Drives io_ctrl, then sio_ctrl. False, with a message, when one of them refuses. When it is
+// sio_ctrl that stays as it was, an input gets the io_ctrl that goes with that.
 bool supervised_drive_control_pins(IOPort *port, ControlLevels levels);
+// Control pins are those of a port that can be an input. Any other is a programming error of the
+// caller, and ends the daemon with the caller's place in the message.
+void supervised_demand_input(IOPort *port, const char *file = __builtin_FILE(),
+                             int line = __builtin_LINE(),
+                             const char *function = __builtin_FUNCTION());
 // What they have to be by the common rule, for a port that can be an input.
 ControlLevels supervised_control_levels(IOPort *port);
 

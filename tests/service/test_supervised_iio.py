@@ -101,6 +101,7 @@ def test_samples_are_followed_while_supervised(device, converters):
         ("be:u12/16>>4", b"\xab\xcd", 0xABC),
         ("le:u10/16>>0", b"\xff\x03", 0x3FF),
         ("le:u8/8>>0", b"\xa5", 0xA5),
+        ("le:u12/16", b"\xcd\x0b", 0xBCD),
         ("be:u24/24>>8", b"\x12\x34\x56", 0x1234),
         ("le:u16/32>>16", b"\x00\x00\x34\x12", 0x1234),
     ],
@@ -120,7 +121,7 @@ def test_a_converter_of_another_kind_ends_the_daemon(device, converters, text):
         start(device, iio())
 
 
-@pytest.mark.parametrize("text", ["", "garbage", "le:u12", "le:u12/16", "le:u12/0>>0"])
+@pytest.mark.parametrize("text", ["", "garbage", "le:u12", "le:u12/0>>0"])
 def test_a_type_that_cannot_be_read_leaves_the_port_out(device, converters, text):
     device.allow_critical("Failed to find device type")
     device.allow_critical("Failed to setup iio device.")

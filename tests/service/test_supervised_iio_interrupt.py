@@ -145,6 +145,22 @@ def test_a_short_record_costs_the_watch_for_a_second(device, converters):
     assert processor_time(device) - used < 0.5
 
 
+def test_a_port_that_was_not_watched_when_its_device_failed_is_watched_anew(device, converters):
+    device.allow_critical("read Error: ")
+    start(device, interrupt(number=0), interrupt('channel="1"', number=1))
+    supervise(device, number=0)
+    converters.send(EVENTS, b"short")
+    device.wait_log("read Error: Input/output error")
+    supervise(device, False, number=0)
+    supervise(device, number=1)
+    with device.signals() as signals:
+        set_raw(converters, 250, 1)
+        converters.send_event(6, 1)
+        signals.wait(lambda change: change.port == 1 and not change.state)
+    assert readout(device, 1) == ("open", 250)
+    assert readout(device, 0)[0] == "closed"
+
+
 def test_a_lost_device_reads_undefined_without_a_busy_loop_and_comes_back(device, converters):
     device.allow_critical("read Error: ")
     start(device, interrupt())
@@ -179,8 +195,8 @@ def test_a_level_that_cannot_be_read_is_looked_at_again(device, converters):
 
 
 def test_beyond_a_limit_the_level_is_read_after_a_while(device, converters):
-    set_raw(converters, 90)
-    start(device, interrupt('lower_limit="95" limit_timeout="20"'))
+    set_raw(converters, 105)
+    start(device, interrupt('lower_limit="110" limit_timeout="20"'))
     supervise(device)
     assert armed(converters) == ["1", "0", "0", "0"]
     set_raw(converters, 150)

@@ -2,7 +2,9 @@
 #include <fcntl.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <filesystem>
+#include <thread>
 
 #include "base/unique-fd.h"
 #include "supervised/iio-sysfs.h"
@@ -166,8 +168,28 @@ TEST_F(Iio, AnOutputNeedsNoConverter) {
 TEST_F(Iio, BeforeTheFirstSampleTheLevelIsZero) {
   const IOPortRef port =
       make({{"range", "state", "short"}, {"range", "lower", "0"}, {"range", "upper", "5"}});
+  EXPECT_EQ(readout(port), "short 0");
   EXPECT_TRUE(io_port_setup(port.get()));
   EXPECT_EQ(readout(port), "short 0");
+}
+
+TEST_F(Iio, ActionThreadsMayAskWhileSamplesCome) {
+  const IOPortRef port = watched();
+  sample(150);
+  std::atomic<bool> done = false;
+  std::thread reader([&] {
+    while (!done) {
+      const std::string now = readout(port);
+      EXPECT_TRUE(now == "closed 150" || now == "undefined 150") << now;
+    }
+  });
+  for (int round = 0; round < 200; ++round) {
+    EXPECT_EQ(::write(writer.get(), "x", 1), 1);
+    iterate();
+    sample(150);
+  }
+  done = true;
+  reader.join();
 }
 
 TEST_F(Iio, ChangesOfTheSampledStateAreReported) {
@@ -220,6 +242,22 @@ TEST_F(Iio, AShortSampleReadsUndefinedAndTheNextOneCounts) {
   EXPECT_EQ(reports(), (Words{"1 on"}));
 }
 
+TEST_F(Iio, AnEventTellsThatASampleCouldNotBeRead) {
+  const IOPortRef port = watched();
+  add_supervised_event(port);
+  sample(150);
+  EXPECT_EQ(reports(), (Words{"event closed", "1 on"}));
+  EXPECT_EQ(::write(writer.get(), "x", 1), 1);
+  iterate();
+  EXPECT_EQ(reports(), (Words{"event undefined", "1 on"}));
+  EXPECT_EQ(readout(port), "undefined 150");
+  EXPECT_EQ(::write(writer.get(), "x", 1), 1);
+  iterate();
+  EXPECT_EQ(reports(), Words{});
+  sample(160);
+  EXPECT_EQ(reports(), (Words{"event closed", "1 on"}));
+}
+
 // The last writer of a FIFO going away looks as a device does that goes away: POLLHUP, end of file.
 TEST_F(Iio, ALostDeviceReadsUndefinedAndIsLookedForOnceASecond) {
   const IOPortRef port = watched();
@@ -254,6 +292,46 @@ TEST_F(Iio, ALostDeviceReadsUndefinedAndIsLookedForOnceASecond) {
   EXPECT_EQ(readout(port), "closed 150");
 }
 
+// A folder can be opened and gives a read error.
+TEST_F(Iio, ADeviceThatCannotBeReadIsLostUntilItCan) {
+  remove("dev/iio:device2");
+  std::filesystem::create_directories(path("dev/iio:device2"));
+  const IOPortRef port = make();
+  io_port_restore_supervised(port.get(), true);
+  EXPECT_TRUE(io_port_setup(port.get()));
+  io_port_set_watch(port.get());
+  iterate();
+  EXPECT_TRUE(was_logged("critical: read Error: Is a directory"));
+  EXPECT_TRUE(was_logged("critical: Readout failed: Is a directory"));
+  EXPECT_EQ(readout(port), "undefined 0");
+  EXPECT_EQ(descriptors("dev/iio:device2"), 0U);
+  EXPECT_EQ(timers(), (std::vector<guint>{kRecovery}));
+  EXPECT_FALSE(g_main_context_iteration(nullptr, FALSE));
+
+  remove("dev/iio:device2");
+  make_node(2);
+  expire(kRecovery);
+  writer.reset(open_node(2));
+  sample(150);
+  EXPECT_EQ(readout(port), "closed 150");
+}
+
+TEST_F(Iio, ADeviceWhoseSamplesEndIsLost) {
+  remove("dev/iio:device2");
+  write("dev/iio:device2", std::string_view("\x96\0", 2));
+  const IOPortRef port = make();
+  add_supervised_event(port);
+  io_port_restore_supervised(port.get(), true);
+  EXPECT_TRUE(io_port_setup(port.get()));
+  io_port_set_watch(port.get());
+  iterate();
+  EXPECT_EQ(reports(), (Words{"event closed", "1 on", "event undefined", "1 on"}));
+  EXPECT_TRUE(was_logged("critical: read Error: No such device"));
+  EXPECT_EQ(readout(port), "undefined 150");
+  EXPECT_EQ(timers(), (std::vector<guint>{kRecovery}));
+  EXPECT_FALSE(g_main_context_iteration(nullptr, FALSE));
+}
+
 TEST_F(Iio, SupervisionMayBeSwitchedWhileTheDeviceIsLost) {
   const IOPortRef port = watched();
   writer.reset();
@@ -268,6 +346,16 @@ TEST_F(Iio, SupervisionMayBeSwitchedWhileTheDeviceIsLost) {
   expire(kRecovery);
   writer.reset(open_node(2));
   sample(150);
+  EXPECT_EQ(readout(port), "closed 150");
+}
+
+TEST_F(Iio, WithoutSupervisionALossIsForgotten) {
+  const IOPortRef port = watched();
+  sample(150);
+  writer.reset();
+  iterate();
+  EXPECT_EQ(readout(port), "undefined 150");
+  EXPECT_TRUE(io_port_set_supervised(port.get(), false));
   EXPECT_EQ(readout(port), "closed 150");
 }
 
@@ -314,7 +402,7 @@ TEST_F(IioDeath, TheControlPinsOfAnOutputAreAProgrammingError) {
         io_port_set_type(port.get(), PORT_OUTPUT);
         supervised_iio_backend_functions(port.get())->set_direction(port.get(), true);
       },
-      "iio_set_control_pins.*port->type == PORT_INPUT");
+      "supervised-iio-backend.*iio_set_control_pins.*port->type == PORT_INPUT");
 }
 
 TEST_F(Iio, OnlyTwoKindsOfEntriesAreKnown) {

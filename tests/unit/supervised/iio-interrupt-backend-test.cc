@@ -4,6 +4,9 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <atomic>
+#include <thread>
+
 #include "base/glib-ptr.h"
 #include "base/unique-fd.h"
 #include "supervised/iio-thresholds.h"
@@ -154,6 +157,32 @@ TEST_F(Interrupt, WithOneThresholdOnlyItsSideIsEnabled) {
   EXPECT_EQ(armed(), "1/100, enabled 0/0");
 }
 
+TEST_F(Interrupt, WithOneThresholdARangeFromZeroIsLeftAtItsUpperEnd) {
+  set_raw(50);
+  const IOPortRef port = watched({{"device", "one_threshold", "true"},
+                                  {"device", "hysteresis", "5"},
+                                  {"range", "state", "short"},
+                                  {"range", "lower", "0"},
+                                  {"range", "upper", "99"}});
+  EXPECT_EQ(armed(), "104/0, enabled 1/0");
+  set_raw(150);
+  send_events(0);
+  EXPECT_EQ(armed(), "104/95, enabled 0/1");
+  EXPECT_TRUE(io_port_set_supervised(port.get(), false));
+  EXPECT_EQ(armed(), "104/95, enabled 0/0");
+}
+
+TEST_F(Interrupt, OneThresholdMayBeEnabledByTheFileForBothSides) {
+  write(attribute(6, "events/in_voltage0_thresh_either_en"), "");
+  remove(attribute(6, "events/in_voltage0_thresh_rising_en"));
+  remove(attribute(6, "events/in_voltage0_thresh_falling_en"));
+  const IOPortRef port = watched({{"device", "one_threshold", "true"}});
+  EXPECT_EQ(event_file("falling_value"), "100");
+  EXPECT_EQ(event_file("either_en"), "1");
+  EXPECT_TRUE(io_port_set_supervised(port.get(), false));
+  EXPECT_EQ(event_file("either_en"), "0");
+}
+
 TEST_F(Interrupt, ChannelsMayHaveNamesOfTheirOwn) {
   write(attribute(6, "in_proximity7_loop_raw"), "42\n");
   write(attribute(6, "events/in_proximity7_loop_thresh_rising_value"), "");
@@ -248,10 +277,11 @@ TEST_F(Interrupt, PortsOfTheSameChannelOnTwoDevicesAreBothArmedAgain) {
 }
 
 TEST_F(Interrupt, BeyondALimitTheLevelIsReadAgainAfterAWhile) {
-  set_raw(40);
+  set_raw(105);
   const IOPortRef port = watched({{"device", "lower_limit", "110"},
                                   {"device", "upper_limit", "280"},
                                   {"device", "limit_timeout", "70"}});
+  EXPECT_EQ(armed(), "1/0, enabled 0/0");
   EXPECT_EQ(timers(), (std::vector<guint>{70}));
   for (const int at_limit : {110, 105, 280, 290}) {
     set_raw(at_limit);
@@ -362,6 +392,47 @@ TEST_F(Interrupt, ARawValueThatCannotBeReadReadsUndefinedUntilItCan) {
   }
 }
 
+TEST_F(Interrupt, AnEventTellsThatTheLineCannotBeRead) {
+  const IOPortRef port = watched();
+  add_supervised_event(port);
+  send_events(0);
+  EXPECT_EQ(reports(), (Words{"event closed", "1 on"}));
+  remove(attribute(6, "in_voltage0_raw"));
+  send_events(0);
+  EXPECT_EQ(reports(), (Words{"event undefined", "1 on"}));
+  set_raw(150);
+  expire(kRecovery);
+  EXPECT_EQ(reports(), (Words{"event closed", "1 on"}));
+  EXPECT_EQ(timers(), std::vector<guint>{});
+}
+
+TEST_F(Interrupt, ALevelThatCouldNotBeReadForAMomentIsToldAgain) {
+  const IOPortRef port = watched();
+  add_supervised_event(port);
+  send_events(0);
+  reports();
+  texts_to_come({"nonsense\n"});
+  send_events(0);
+  EXPECT_EQ(reports(), (Words{"event undefined", "1 on"}));
+  EXPECT_EQ(armed(), "200/100, enabled 1/1");
+  EXPECT_EQ(readout(port), "closed 150");
+  expire(kLimit);
+  EXPECT_EQ(reports(), (Words{"event closed", "1 on"}));
+  EXPECT_EQ(timers(), std::vector<guint>{});
+}
+
+TEST_F(Interrupt, AnEventTellsThatALevelBeyondALimitCannotBeReadAnyMore) {
+  set_raw(110);
+  const IOPortRef port = watched({{"device", "lower_limit", "120"}});
+  add_supervised_event(port);
+  expire(kLimit);
+  EXPECT_EQ(reports(), (Words{"event closed", "1 on"}));
+  remove(attribute(6, "in_voltage0_raw"));
+  expire(kLimit);
+  EXPECT_EQ(reports(), (Words{"event undefined", "1 on"}));
+  EXPECT_TRUE(was_logged("critical: Unable to read from port Line\n"));
+}
+
 TEST_F(Interrupt, AShortRecordEndsTheWatchUntilTheDeviceIsOpenedAnew) {
   const IOPortRef port = watched();
   send_events(0);
@@ -414,12 +485,47 @@ TEST_F(Interrupt, SupervisionMayBeSwitchedWhileTheDeviceIsLost) {
   const IOPortRef port = watched();
   writer.reset();
   iterate();
+  remove("sys/bus/iio/devices/iio:device6/name");
   EXPECT_TRUE(io_port_set_supervised(port.get(), false));
   EXPECT_EQ(timers(), std::vector<guint>{});
   EXPECT_TRUE(io_port_set_supervised(port.get(), true));
   EXPECT_EQ(timers(), (std::vector<guint>{kRecovery}));
+  EXPECT_EQ(readout(port), "undefined 150");
+  make_device(6, "comparator");
   expire(kRecovery);
   EXPECT_EQ(armed(), "200/100, enabled 1/1");
+}
+
+TEST_F(Interrupt, APortThatWasNotWatchedWhenItsDeviceFailedGetsEventsAgain) {
+  const IOPortRef first = watched();
+  const IOPortRef second = make({{"device", "channel", "1"}});
+  EXPECT_TRUE(io_port_setup(second.get()));
+  io_port_set_number(second.get(), 2);
+  EXPECT_EQ(::write(writer.get(), "short", 5), 5);
+  iterate();
+  reports();
+  EXPECT_TRUE(io_port_set_supervised(second.get(), true));
+  set_raw(250, 1);
+  send_events(1);
+  EXPECT_EQ(reports(), (Words{"2 off"}));
+  EXPECT_EQ(armed(1), "300/201, enabled 1/1");
+  expire(kRecovery);
+  EXPECT_EQ(readout(first), "closed 150");
+  EXPECT_EQ(descriptors("dev/iio:device6.events"), 2U);  // the test has one
+}
+
+TEST_F(Interrupt, WithoutSupervisionALossIsForgotten) {
+  const IOPortRef cached = watched();
+  const IOPortRef fresh = watched({{"device", "cache_ad_value", "false"}});
+  writer.reset();
+  iterate();
+  EXPECT_EQ(readout(cached), "undefined 150");
+  EXPECT_EQ(readout(fresh), "undefined 150");
+  EXPECT_TRUE(io_port_set_supervised(cached.get(), false));
+  EXPECT_TRUE(io_port_set_supervised(fresh.get(), false));
+  EXPECT_EQ(readout(cached), "closed 150");
+  set_raw(250);
+  EXPECT_EQ(readout(fresh), "open 250");
 }
 
 TEST_F(Interrupt, ReadoutsAreCachedUnlessTheDocumentSaysOtherwise) {
@@ -530,6 +636,39 @@ TEST_F(Interrupt, APortWithNothingButAPinIsRefusedAndHarmless) {
   EXPECT_EQ(timers(), std::vector<guint>{});
 }
 
+TEST_F(Interrupt, BeforeAnythingIsReadTheLevelIsZero) {
+  const Property device = {"device", "driver", "unknown"};
+  for (const bool set_up : {false, true}) {
+    const IOPortRef port = set_up ? make() : make({device});
+    EXPECT_EQ(io_port_setup(port.get()), set_up);
+    EXPECT_TRUE(io_port_set_supervised_range(port.get(), "short", 0, 5, nullptr));
+    EXPECT_EQ(readout(port), "short 0");
+  }
+  const IOPortRef fresh = make({device, {"device", "cache_ad_value", "false"}});
+  EXPECT_FALSE(io_port_setup(fresh.get()));
+  EXPECT_EQ(readout(fresh), "error 0: Failed to read the level: no device");
+}
+
+TEST_F(Interrupt, ActionThreadsMayReadWhileTheDeviceIsFoundAnew) {
+  const IOPortRef port = watched();
+  std::atomic<bool> done = false;
+  std::thread reader([&] {
+    while (!done) {
+      EXPECT_TRUE(io_port_get_state(port.get()));
+      const std::string now = readout(port);
+      EXPECT_TRUE(now == "closed 150" || now == "undefined 150") << now;
+    }
+  });
+  for (int round = 0; round < 20; ++round) {
+    EXPECT_EQ(::write(writer.get(), "short", 5), 5);
+    iterate();
+    expire(kRecovery);
+  }
+  done = true;
+  reader.join();
+  EXPECT_EQ(readout(port), "closed 150");
+}
+
 TEST_F(Interrupt, AnOutputNeedsNoConverter) {
   for (const char *mode : {"adc", "supervised"}) {
     const IOPortRef port = make_port(kIioInterruptKind, PORT_OUTPUT,
@@ -566,6 +705,16 @@ TEST_F(Interrupt, APullUpMayStayOnWhileSupervised) {
   EXPECT_EQ(armed(), "200/100, enabled 1/1");
 }
 
+TEST_F(Interrupt, APullUpStaysOnWhenTheMeasuredPathCannotBeLeft) {
+  const IOPortRef port = make({{"device", "pullup_when_supervised", "true"}});
+  io_port_restore_supervised(port.get(), true);
+  EXPECT_TRUE(io_port_setup(port.get()));
+  break_line(3);
+  EXPECT_TRUE(io_port_set_supervised(port.get(), false));
+  EXPECT_TRUE(was_logged("critical: Failed to set sioctrl pin"));
+  EXPECT_TRUE(line(2) && line(3));
+}
+
 TEST_F(Interrupt, ADroppedPortHoldsNothingAndComesBackAgainAndAgain) {
   const IOPortRef port = make({{"device", "lower_limit", "120"}});
   io_port_restore_supervised(port.get(), true);
@@ -596,7 +745,7 @@ TEST_F(Interrupt, TheControlPinsOfAnOutputAreAProgrammingError) {
         io_port_set_type(port.get(), PORT_OUTPUT);
         supervised_iio_interrupt_backend_functions(port.get())->set_direction(port.get(), true);
       },
-      "iio_int_set_control_pins.*port->type == PORT_INPUT");
+      "supervised-iio-interrupt-backend.*iio_int_set_control_pins.*port->type == PORT_INPUT");
 }
 
 }  // namespace

@@ -22,9 +22,19 @@ TEST(IioSampleType, IsReadFieldByField) {
   EXPECT_EQ(type->shift, 6U);
 }
 
-TEST(IioSampleType, IsRefusedUnlessComplete) {
-  for (const char *text : {"", "garbage", "le", "le:u", "le:u12", "le:u12/16", "le:u12/16X2>>4",
-                           "le:u12/0>>4", "leu12/16>>4", "le:u12/16>>"}) {
+TEST(IioSampleType, MayGoWithoutAShift) {
+  for (const char *text : {"le:u12/16", "le:u12/16>>", "le:u12/16X2>>4"}) {
+    const auto type = iio_parse_sample_type(text);
+    ASSERT_TRUE(type) << text;
+    EXPECT_EQ(type->bits, 12U);
+    EXPECT_EQ(type->bytes, 2U);
+    EXPECT_EQ(type->shift, 0U);
+  }
+}
+
+TEST(IioSampleType, IsRefusedInAnotherFormAndWithoutASize) {
+  for (const char *text :
+       {"", "garbage", "le", "leu12/16>>4", "le:u", "le:u12", "le:u/16>>4", "le:u12/0>>4"}) {
     EXPECT_FALSE(iio_parse_sample_type(text)) << text;
   }
 }
@@ -39,6 +49,7 @@ TEST(IioSample, TwoBytes) {
   EXPECT_EQ(decode("le:u12/16>>4", {0xCD, 0xAB}), 0xABCU);
   EXPECT_EQ(decode("le:u10/16>>0", {0xFF, 0x03}), 0x3FFU);
   EXPECT_EQ(decode("le:u10/16>>0", {0xFF, 0x03}, 2), 0xFFU);
+  EXPECT_EQ(decode("be:u16/16", {0xAB, 0xCD}), 0xABCDU);
 }
 
 TEST(IioSample, ThreeBytes) {

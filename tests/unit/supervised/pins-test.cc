@@ -131,6 +131,37 @@ TEST_F(Pins, AMeasuredPathThatCannotBeLeftIsNotJoinedByThePlainOne) {
   EXPECT_EQ(control(), "01");
 }
 
+TEST_F(Pins, AnOutputIsTakenOffThePlainPathWhateverTheOtherDoes) {
+  const IOPortRef port = make(PORT_CONFIGURABLE);
+  EXPECT_TRUE(io_port_setup(port.get()));
+  break_line(kSioCtrl);
+  EXPECT_TRUE(io_port_set_direction(port.get(), false));
+  EXPECT_TRUE(was_logged("critical: Failed to set sioctrl pin"));
+  EXPECT_EQ(control(), "00");
+}
+
+TEST_F(Pins, AnOutputIsNotPutOnThePlainPathBecauseTheMeasuredOneCannotBeLeft) {
+  const IOPortRef port = make(PORT_CONFIGURABLE);
+  io_port_restore_supervised(port.get(), true);
+  EXPECT_TRUE(io_port_setup(port.get()));
+  break_line(kSioCtrl);
+  EXPECT_TRUE(io_port_set_direction(port.get(), false));
+  EXPECT_EQ(control(), "01");
+}
+
+TEST_F(Pins, AnInputThatIsMadeOfAnOutputGetsThePlainPathWhateverTheOtherDoes) {
+  for (const bool supervised : {false, true}) {
+    const IOPortRef port = make(PORT_CONFIGURABLE);
+    io_port_restore_supervised(port.get(), supervised);
+    io_port_restore_direction(port.get(), false);
+    EXPECT_TRUE(io_port_setup(port.get()));
+    break_line(kSioCtrl);
+    EXPECT_TRUE(io_port_set_direction(port.get(), true));
+    EXPECT_EQ(control(), "10") << supervised;
+    mend_lines();
+  }
+}
+
 TEST_F(Pins, AConfigurablePortNeedsBothPlainPins) {
   const IOPortRef port = make_port(kSpiKind, PORT_CONFIGURABLE, {{"input", "pin", "1"}});
   EXPECT_FALSE(io_port_setup(port.get()));

@@ -45,6 +45,19 @@ TEST_F(Ranges, AnEmptyRangeIsRefused) {
   EXPECT_TRUE(ranges_of(port).empty());
 }
 
+TEST_F(Ranges, ALevelOfAPortWithoutRangesCannotBeClassified) {
+  const IOPortRef output = make_port(kSpiKind, PORT_OUTPUT, {});
+  io_port_restore_name(output.get(), "Siren", false);
+  SupervisedRangeState state = SUPERVISED_STATE_OPEN;
+  Error error;
+  EXPECT_FALSE(supervised_classify_for_port(output.get(), 5, &state, error.out()));
+  EXPECT_EQ(state, SUPERVISED_STATE_UNDEFINED);
+  ASSERT_TRUE(error);
+  EXPECT_EQ(error.get()->domain, io_supervised_error_quark());
+  EXPECT_EQ(error.get()->code, IO_SUPERVISED_ERROR_NOT_SUPERVISED);
+  EXPECT_STREQ(error.message(), "Failed to get ranges from port Siren");
+}
+
 TEST_F(Ranges, LimitsEndBelow65536) {
   EXPECT_EQ(set("open", 0, 65536), "Invalid range.");
   EXPECT_EQ(set("open", 65536, 70000), "Invalid range.");

@@ -71,8 +71,10 @@ void on_port_changed(const PortChange &change) {
   all_reports.push_back(std::to_string(change.number) + (change.state ? " on" : " off"));
 }
 
-void on_send_event(IOPort * /*port*/, IoEvent * /*event*/, std::int32_t state) {
-  all_reports.push_back("event " + std::to_string(state));
+// The supervised event asks the port for the state that it tells, whatever was reported.
+void on_send_event(IOPort *port, IoEvent * /*event*/, std::int32_t /*state*/) {
+  const SupervisedRangeState state = io_port_get_supervised_state(port);
+  all_reports.push_back(std::string("event ") + supervised_range_state2string(state));
 }
 
 }  // namespace
@@ -204,6 +206,12 @@ IOPortRef Bench::make_port(int kind, PortType type, const std::vector<Property> 
                                  property.value.c_str());
   }
   return port;
+}
+
+void Bench::add_supervised_event(const IOPortRef &port) {
+  IoEvent event;
+  event.supervised_input = true;
+  io_port_events(port.get()).push_front(std::move(event));
 }
 
 SupervisedRanges Bench::ranges_of(const IOPortRef &port) {

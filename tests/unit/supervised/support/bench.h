@@ -51,9 +51,11 @@ class Bench : public testing::Test {
   // --- Ports ---
   // A port with its backend bound and the properties applied, numbered 1.
   static IOPortRef make_port(int kind, PortType type, const std::vector<Property> &properties);
+  // Gives the port an event that tells the state of its line while it is supervised.
+  static void add_supervised_event(const IOPortRef &port);
   static SupervisedRanges ranges_of(const IOPortRef &port);
 
-  // --- Reports: "1 on" for PortChanged of port 1, "event 3" for an event sent with state 3 ---
+  // --- Reports: "1 on" for PortChanged of port 1, "event cut" for an event ---
   static std::vector<std::string> reports();
 
   // --- The log: "critical: text" ---
