@@ -14,7 +14,6 @@ struct SupervisedData : PortBackendData {
   GpioPinPtr sio_ctrl;  // 1: the line goes to the converter
   GpioPinPtr input;
   GpioPinPtr output;
-  int io_ctrl_level = -1;  // the last one driven; -1: none
   // For the pins' handles, since action threads drive the output. Nothing else is locked while it
   // is held.
   std::mutex pins_lock;
@@ -25,7 +24,6 @@ struct SupervisedData : PortBackendData {
   // number, and ports that share one leave each other's alone.
   SupervisedRangeState last_state = SUPERVISED_STATE_UNDEFINED;
 
-  bool supervised = false;   // the last value given to set_supervised
   bool initialised = false;  // set-up has succeeded and the port was not dropped since
 };
 

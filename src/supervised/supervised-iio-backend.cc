@@ -295,7 +295,7 @@ bool setup(IOPort *port, bool initial_level) {
 }
 
 bool set_supervised(IOPort *port, bool supervised) {
-  return supervised_switch(port, supervised, supervised, kParts);
+  return supervised_switch(port, supervised, kParts);
 }
 
 void start_watch(IOPort *port) {

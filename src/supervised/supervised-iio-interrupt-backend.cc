@@ -40,7 +40,7 @@ bool is_supervisable(IOPort *port) {
 }
 
 bool set_supervised(IOPort *port, bool supervised) {
-  return supervised_switch(port, supervised, supervised || iio_int_data(port)->adc_mode, kParts);
+  return supervised_switch(port, supervised || iio_int_data(port)->adc_mode, kParts);
 }
 
 bool set_supervised_ranges(IOPort *port, SupervisedRanges ranges, GError **error) {

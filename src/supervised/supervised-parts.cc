@@ -42,8 +42,8 @@ void supervised_switch_watch(IOPort *port, bool measured, const SupervisedParts 
   parts.set_line_watch(port, measured);
 }
 
-bool supervised_switch(IOPort *port, bool supervised, bool measured, const SupervisedParts &parts) {
-  SupervisedData *data = supervised_data(port);
+bool supervised_switch(IOPort *port, bool measured, const SupervisedParts &parts) {
+  const SupervisedData *data = supervised_data(port);
   supervised_switch_watch(port, measured, parts);
   if (!io_port_input(port) && !io_port_set_direction(port, true)) {
     return false;
@@ -51,7 +51,6 @@ bool supervised_switch(IOPort *port, bool supervised, bool measured, const Super
   if (data->initialised) {
     (void)parts.set_control_pins(port);
   }
-  data->supervised = supervised;
   return true;
 }
 

@@ -24,6 +24,6 @@ bool supervised_is_supervisable(IOPort *port);
 void supervised_switch_watch(IOPort *port, bool measured, const SupervisedParts &parts);
 // A set_supervised: switches the watch, makes the port an input and drives the control pins. Where
 // the line stays measured without supervision `measured` differs from `supervised`.
-bool supervised_switch(IOPort *port, bool supervised, bool measured, const SupervisedParts &parts);
+bool supervised_switch(IOPort *port, bool measured, const SupervisedParts &parts);
 // A set_direction, called with the new direction already in the port. False when a pin refused.
 bool supervised_turn(IOPort *port, bool input, const SupervisedParts &parts);

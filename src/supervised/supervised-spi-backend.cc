@@ -47,10 +47,7 @@ SpiSupervisedData *data_of(IOPort *port) {
 }
 
 bool spi_set_control_pins(IOPort *port) {
-  if (io_port_get_type(port) == PORT_OUTPUT) {
-    g_assertion_message_expr(G_LOG_DOMAIN, __FILE__, __LINE__, __func__,
-                             "port->type == PORT_INPUT");
-  }
+  supervised_demand_input(port);
   return supervised_drive_control_pins(port, supervised_control_levels(port));
 }
 
@@ -98,7 +95,7 @@ bool spi_setup(IOPort *port, bool initial_level) {
 // --- Operations ---
 
 bool set_supervised(IOPort *port, bool supervised) {
-  return supervised_switch(port, supervised, supervised, kParts);
+  return supervised_switch(port, supervised, kParts);
 }
 
 // A transfer that failed costs the device until the port is set up again. Unset, with errno: it
