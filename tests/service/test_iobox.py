@@ -330,6 +330,29 @@ def test_a_monitor_that_hangs_holds_start_up_once_and_not_for_every_port(make_de
     assert len(ids(device)) == 1 + len(numbers)
 
 
+@pytest.mark.parametrize(
+    "method, kind, in_service", [("GetIOState", "input", 0), ("SetIOMode", "output", 20)]
+)
+def test_a_method_that_is_never_answered_holds_start_up_once_and_not_for_every_port(
+    make_device, neighbourhood, method, kind, in_service
+):
+    device = make_device()
+    device.conf(hwdesc(
+        *(port(f"port{number}", number, kind, backend="iobox", optional=True)
+          for number in range(20, 40)),
+        port("other", OTHER),
+    ))  # fmt: skip
+    IoBox(neighbourhood, device, ignored=[method])
+    began = time.monotonic()
+    device.start()
+    assert 24 < time.monotonic() - began < 35
+    assert len(ids(device)) == in_service
+    assert device.log_count(f"{NO_CALL}{method}: ") == 20
+    began = time.monotonic()
+    device.call("RefreshIOPorts")
+    assert time.monotonic() - began < 10
+
+
 # Line states
 
 
