@@ -255,7 +255,15 @@ std::optional<unsigned int> number_of(const char *name) {
     return std::nullopt;
   }
   const auto line = ugpio_host_find_line(name);
-  return line ? ugpio_host_line_number(*line) : std::nullopt;
+  if (!line) {
+    explain("find GPIO line", name);
+    return std::nullopt;
+  }
+  const auto number = ugpio_host_line_number(*line);
+  if (!number) {
+    explain("find the number of GPIO line " + std::string(name) + " in", root() + "/class/gpio");
+  }
+  return number;
 }
 
 }  // namespace
