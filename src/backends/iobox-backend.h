@@ -1,12 +1,14 @@
 // Ports of external I/O boxes, which another service looks after: this is a client of it.
 //
-// Calls of the service block the calling thread. While the service does not answer, a call waits
-// 25 seconds, but for the following minute further calls of the same process of the service wait
-// only 0.1 seconds each (base/patience.h); what they ask of a box is still delivered if the service
-// recovers. So a service that hangs holds start-up, or a refresh, for 25 seconds plus 0.1 seconds
-// for every port on a box, and each later request for a box at most 25 seconds. A service that
-// answers late is waited for: three answers for an input, two for an output, at the worst just
-// under 25 seconds each.
+// Calls of the service block the calling thread, for 25 seconds at most, and one process of the
+// service is not waited for like that again and again (base/patience.h). After a call that it left
+// without an answer, its calls get 0.1 seconds each for a minute, but for methods that answer in
+// that time; what they ask of a box is still delivered if the service recovers. So a service that
+// hangs, or leaves one method without an answer, holds start-up, or a refresh, for 25 seconds plus
+// 0.1 seconds for every port on a box. One that answers late is waited for until its late answers
+// add up to a minute, so it holds them for 85 seconds at most, plus 0.1 seconds for every call
+// after that; ports that did not come into service by then need a refresh. A pass of more than a
+// minute of short waits begins anew.
 #pragma once
 
 #include <atomic>

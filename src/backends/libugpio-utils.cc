@@ -10,7 +10,7 @@ namespace {
 constexpr int kDecimal = 10;
 constexpr const char *kLabel = "pin";
 
-// The edges stay alterable, since supervision switches them off and on.
+// The device's flags, passed as they stand.
 constexpr unsigned int kInput =
     UGPIOF_DIR_IN | UGPIOF_TRIG_FALL | UGPIOF_TRIG_RISE | UGPIOF_ALTER_DIR | UGPIOF_ALTER_EDGE;
 constexpr unsigned int kOutputLow = UGPIOF_ALTER_DIR;

@@ -47,7 +47,8 @@ bool setup(IOPort *port, bool /*initial_level*/) {
     log_warning("Port %s: an SPI ADC port can only be an input", io_port_describe(port));
     return false;
   }
-  data->fd.reset(open(data->device.c_str(), O_RDONLY | O_CLOEXEC));
+  // A path that names a pipe, by mistake, must not hold the start until somebody writes to it.
+  data->fd.reset(open(data->device.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
   if (!data->fd) {
     log_warning("Failed to open %s: %s", data->device.c_str(), g_strerror(errno));
   }

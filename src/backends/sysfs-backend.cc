@@ -4,6 +4,7 @@
 #include <unistd.h>
 
 #include <array>
+#include <atomic>
 #include <cerrno>
 #include <cstdlib>
 #include <limits>
@@ -23,8 +24,8 @@ constexpr std::size_t kReadBuffer = 64;
 struct SysfsBackendData : PortBackendData {
   std::string path;
   UniqueFd fd;
-  std::uint32_t timeout = 0;  // milliseconds between two polls
-  std::uint32_t state = 0;    // the last raw reading, after inversion
+  std::uint32_t timeout = 0;             // milliseconds between two polls
+  std::atomic<std::uint32_t> state = 0;  // the last raw reading, after inversion
   Source source;
   bool clear_flag = false;
   bool inverted = false;

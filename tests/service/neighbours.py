@@ -6,7 +6,7 @@ import os
 import signal
 import subprocess
 from pathlib import Path
-from typing import Any, Iterator, Optional
+from typing import Any, Iterator, Optional, Sequence
 
 from gi.repository import GLib
 
@@ -114,13 +114,18 @@ class IoBox:
         "Storm": ("i", "", _STORM),
     }
 
-    def __init__(self, neighbourhood: Neighbourhood, device: Device, **changed: tuple[str, str]):
-        """`changed` maps a method to the signature and the code of its answer."""
+    def __init__(
+        self, neighbourhood: Neighbourhood, device: Device, ignored: Sequence[str] = (),
+        **changed: tuple[str, str],
+    ):  # fmt: skip
+        """`changed` maps a method to the signature and the code of its answer; `ignored` have none."""
         methods = {**self.METHODS}
         for method, (signature, code) in changed.items():
             methods[method] = (methods[method][0], signature, code)
         listed = [(name, *rest) for name, rest in methods.items()]
-        self.service = neighbourhood.play(device, IOBOX, {self.PATH: (IOBOX, {}, listed)})
+        self.service = neighbourhood.play(
+            device, IOBOX, {self.PATH: (IOBOX, {}, listed)}, ignored=ignored
+        )
 
     def answer(self, method: str, signature: str, code: str) -> None:
         """Changes the answer of a method while the service runs."""

@@ -1,8 +1,9 @@
 """A template of python-dbusmock that plays any service.
 
 Its parameters: "objects", a map from path to (interface, properties, methods); "delay", for how many
-seconds every reading of properties takes; "error", the error that answers it; "endless", a folder below which every path has an object
-with the property "Enabled".
+seconds every reading of properties takes; "error", the error that answers it; "endless", a folder
+below which every path has an object with the property "Enabled"; "ignored", methods whose calls are
+never answered.
 """
 
 import os
@@ -23,8 +24,11 @@ def load(mock, parameters):
     delay = parameters.get("delay", 0)
     endless = parameters.get("endless")
     error = parameters.get("error")
+    ignored = parameters.get("ignored", [])
 
     def on_message(connection, message):
+        if message.get_member() in ignored:
+            return dbus.lowlevel.HANDLER_RESULT_HANDLED
         if message.get_member() != "GetAll":
             return dbus.lowlevel.HANDLER_RESULT_NOT_YET_HANDLED
         time.sleep(delay)

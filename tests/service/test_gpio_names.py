@@ -62,6 +62,7 @@ def test_a_name_that_no_chip_has(device, tree):
     device.conf(hwdesc(output('alias="bell"')))
     device.start()
     assert device.log_count("Failed to allocate pin 0/bell") == 1
+    assert device.log_count("Can't find GPIO line bell: No such file or directory") == 1
     assert tree.take() == []
     assert device.call("GetState", "u", 0) is True
 
@@ -72,3 +73,21 @@ def test_a_chip_that_is_out_of_order_hides_no_line_of_others(device, devices, tr
     device.conf(hwdesc(output('alias="siren"')))
     device.start()
     tree.wait(*(f"gpio482/{text}" for text in OUTPUT_WRITES))
+
+
+def test_a_chip_that_is_out_of_order_is_given_as_the_reason_for_a_name_that_no_other_has(
+    device, devices, tree
+):
+    (devices.root / "sys/devices/platform/soc/gpiochip0/dev").unlink()
+    device.conf(hwdesc(output('alias="led"')))
+    device.start()
+    assert device.log_count("Can't find GPIO line led: Inappropriate ioctl for device") == 1
+
+
+def test_the_chip_of_the_lowest_number_has_a_name_that_several_have(device, devices, tree):
+    for chip in (10, 2, 11, 3):
+        add_gpiochip(devices, chip, f"bank{chip}", ["twin"], 1000 + chip)
+    tree.line(1002)
+    device.conf(hwdesc(output('alias="twin"')))
+    device.start()
+    tree.wait(*(f"gpio1002/{text}" for text in OUTPUT_WRITES))

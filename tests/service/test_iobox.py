@@ -11,11 +11,12 @@ neighbourhood = pytest.fixture(neighbourhood_fixture)
 
 INPUT, OUTPUT, EITHER, FIXED, OTHER = 1, 2, 3, 4, 9
 
-UNKNOWN_WORD = "iobox_state_to_portd_state@67: Unrecognized iobox supervised state: "
-NO_CALL = "iobox_dbus_call@44: Failed to call method "
-NO_CONNECTION_STATUS = "iobox_port_setup@180: Could not get IO box connection status"
-NO_PORT_STATUS = "iobox_port_setup@193: Could not get IO port status"
-NO_INITIAL_STATE = "iobox_port_setup@219: Could not get initial IO state"
+# Messages with their levels, by which the log collector files them.
+UNKNOWN_WORD = "WARNING: portd: iobox_state_to_portd_state@67: Unrecognized iobox supervised state: "
+NO_CALL = "LEVEL256: portd: iobox_dbus_call@44: Failed to call method "
+NO_CONNECTION_STATUS = "LEVEL256: portd: iobox_port_setup@180: Could not get IO box connection status"
+NO_PORT_STATUS = "LEVEL256: portd: iobox_port_setup@193: Could not get IO port status"
+NO_INITIAL_STATE = "LEVEL256: portd: iobox_port_setup@219: Could not get initial IO state"
 
 DOCUMENT = hwdesc(
     port("input", INPUT, backend="iobox", optional=True),
@@ -266,6 +267,13 @@ def test_an_error_as_the_answer_parks_the_port(device, neighbourhood, method, me
     expect_working(device, box)
 
 
+def test_events_stay_on_when_only_the_state_can_not_be_had(device, neighbourhood):
+    IoBox(neighbourhood, device, GetIOState=("s", "raise ValueError('out of order')"))
+    device.start()
+    assert ids(device) == {"fixed", "output"}
+    assert not is_silent(device, FIXED)
+
+
 WRONG_ANSWERS = [("", ""), ("i", "ret = 1"), ("v", "ret = dbus.String('enabled', variant_level=1)"),
                  ("as", "ret = ['enabled']"), ("u", "ret = 2**32 - 1")]  # fmt: skip
 
@@ -330,6 +338,29 @@ def test_a_monitor_that_hangs_holds_start_up_once_and_not_for_every_port(make_de
     assert len(ids(device)) == 1 + len(numbers)
 
 
+@pytest.mark.parametrize(
+    "method, kind, in_service", [("GetIOState", "input", 0), ("SetIOMode", "output", 20)]
+)
+def test_a_method_that_is_never_answered_holds_start_up_once_and_not_for_every_port(
+    make_device, neighbourhood, method, kind, in_service
+):
+    device = make_device()
+    device.conf(hwdesc(
+        *(port(f"port{number}", number, kind, backend="iobox", optional=True)
+          for number in range(20, 40)),
+        port("other", OTHER),
+    ))  # fmt: skip
+    IoBox(neighbourhood, device, ignored=[method])
+    began = time.monotonic()
+    device.start()
+    assert 24 < time.monotonic() - began < 35
+    assert len(ids(device)) == in_service
+    assert device.log_count(f"{NO_CALL}{method}: ") == 20
+    began = time.monotonic()
+    device.call("RefreshIOPorts")
+    assert time.monotonic() - began < 10
+
+
 # Line states
 
 
@@ -353,7 +384,7 @@ def test_a_word_that_is_not_known_is_warned_of_and_reads_undefined(device, neigh
         box.report(INPUT, "ajar")
         changes.wait(lambda change: not change.state)
     assert state(device, INPUT) is False
-    assert f"WARNING: portd: {UNKNOWN_WORD}ajar" in device.log()
+    assert device.log_count(f"{UNKNOWN_WORD}ajar") == 1
 
 
 def test_the_word_undefined_at_start_is_warned_of_too(device, neighbourhood):

@@ -1,6 +1,7 @@
 """Inputs that sample a converter on an SPI bus, through the kernel's spidev interface."""
 
 import errno
+import os
 from typing import Iterator
 
 import pytest
@@ -157,6 +158,13 @@ def test_a_device_that_is_missing_is_sampled_in_vain(device):
     device.wait_log(FAILURE + "Bad file descriptor", 3)
     assert device.call("GetState", "u", 0) is False
     call_everything(device, numbers=(0,))
+
+
+def test_a_pipe_in_place_of_a_device_does_not_hold_the_start(device):
+    os.mkfifo(device.mkdir("/run/pipes") / "spidev")
+    start(device, spiadc(device="/run/pipes/spidev"))
+    device.wait_log(FAILURE + "Inappropriate ioctl for device")
+    assert device.call("GetState", "u", 0) is False
 
 
 @pytest.mark.parametrize("kind", ["output", "io_ctrl"])

@@ -1,5 +1,6 @@
 """Supervised inputs whose line is measured through an SPI converter."""
 
+import os
 from typing import Iterator
 
 import pytest
@@ -184,3 +185,9 @@ def test_a_dropped_port_keeps_one_descriptor_and_comes_back_fifty_times(device, 
     assert ("short", 0x10, 0x20) in supervised(device, "GetSupervisedRanges", "u", 0)
     reads = len(converters.spi_calls())
     wait_for(lambda: len(converters.spi_calls()) > reads, "the watch")
+
+
+def test_a_pipe_in_place_of_a_device_does_not_hold_the_start(device, converters):
+    os.mkfifo(device.mkdir("/run/pipes") / "spidev")
+    start(device, supervised_port("spi", '<device path="/run/pipes/spidev"/>'))
+    assert "/run/pipes/spidev" in device.descriptors()

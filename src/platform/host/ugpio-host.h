@@ -20,8 +20,9 @@ struct UgpioHostLine {
   unsigned int offset;
 };
 
-// The line of that name among the GPIO character devices, the first one where names repeat.
-// Nothing, with errno, when there is none.
+// The line of that name among the GPIO character devices. Where names repeat, it is the first one
+// of the chip with the lowest number. Nothing, with errno, when there is none: ENOENT, or why a
+// chip that might have it could not be asked.
 std::optional<UgpioHostLine> ugpio_host_find_line(const char *name);
 
 // The number by which sysfs knows the line. Nothing, with errno, when sysfs has no chip for it, or

@@ -21,6 +21,7 @@ struct Ugpio {
   bool input = false;
   // Until then (monotonic, in microseconds) a missing or forbidden file is waited for.
   gint64 settle_deadline = 0;
+  bool complete = false;  // one of the files was there, so that a missing one stays missing
   UniqueFd value;
 };
 
@@ -83,16 +84,18 @@ UniqueFd open_file(const std::string &path, int flags) {
 }
 
 bool may_settle(const ugpio_t &context, int code) {
-  return (code == ENOENT || code == EACCES) && g_get_monotonic_time() < context.settle_deadline;
+  const bool may_change = code == EACCES || (code == ENOENT && !context.complete);
+  return may_change && g_get_monotonic_time() < context.settle_deadline;
 }
 
-UniqueFd open_attribute(const ugpio_t &context, const char *name, int flags) {
+UniqueFd open_attribute(ugpio_t &context, const char *name, int flags) {
   const std::string path = line_path(context) + "/" + name;
   UniqueFd fd = open_file(path, flags);
   while (!fd && may_settle(context, errno)) {
     g_usleep(kSettlePoll);
     fd = open_file(path, flags);
   }
+  context.complete = context.complete || fd;
   return fd;
 }
 
@@ -108,11 +111,11 @@ bool write_text(const UniqueFd &fd, std::string_view text) {
   return written >= 0 && static_cast<std::size_t>(written) == text.size();
 }
 
-bool write_attribute(const ugpio_t &context, const char *name, std::string_view text) {
+bool write_attribute(ugpio_t &context, const char *name, std::string_view text) {
   return write_text(open_attribute(context, name, O_WRONLY | O_TRUNC), text);
 }
 
-bool write_or_explain(const ugpio_t &context, const char *name, std::string_view text) {
+bool write_or_explain(ugpio_t &context, const char *name, std::string_view text) {
   const bool written = write_attribute(context, name, text);
   if (!written) {
     explain("write", line_path(context) + "/" + name);
@@ -185,7 +188,7 @@ const char *edge_word(unsigned int flags) {
 }
 
 // A line that can't interrupt has no such file. It can still be read, which is better than no line.
-bool set_edges(const ugpio_t &context, unsigned int flags) {
+bool set_edges(ugpio_t &context, unsigned int flags) {
   if (write_attribute(context, "edge", edge_word(flags))) {
     return true;
   }
@@ -198,7 +201,7 @@ bool set_edges(const ugpio_t &context, unsigned int flags) {
 }
 
 // Edges that an earlier user left on would keep the line from becoming an output.
-bool clear_edges(const ugpio_t &context) {
+bool clear_edges(ugpio_t &context) {
   const auto edges = ugpio_host_read_file(line_path(context) + "/edge");
   return !edges || edges->empty() || edges == "none" || write_or_explain(context, "edge", "none");
 }
@@ -212,7 +215,7 @@ bool make_input(ugpio_t &context, unsigned int flags) {
   return triggers ? set_edges(context, flags) : clear_edges(context);
 }
 
-bool make_output(const ugpio_t &context, unsigned int flags) {
+bool make_output(ugpio_t &context, unsigned int flags) {
   const bool high = (flags & UGPIOF_INIT_HIGH) != 0;
   return clear_edges(context) && write_or_explain(context, "direction", high ? "high" : "low");
 }
@@ -223,7 +226,7 @@ bool configure(ugpio_t &context, unsigned int flags) {
 
 // --- Values ---
 
-UniqueFd open_value(const ugpio_t &context) {
+UniqueFd open_value(ugpio_t &context) {
   if (!context.input) {
     UniqueFd fd = open_attribute(context, "value", O_RDWR);
     if (fd || errno != EACCES) {
@@ -252,7 +255,15 @@ std::optional<unsigned int> number_of(const char *name) {
     return std::nullopt;
   }
   const auto line = ugpio_host_find_line(name);
-  return line ? ugpio_host_line_number(*line) : std::nullopt;
+  if (!line) {
+    explain("find GPIO line", name);
+    return std::nullopt;
+  }
+  const auto number = ugpio_host_line_number(*line);
+  if (!number) {
+    explain("find the number of GPIO line " + std::string(name) + " in", root() + "/class/gpio");
+  }
+  return number;
 }
 
 }  // namespace

@@ -1,4 +1,5 @@
-// Counts what the test program allocates through operator new.
+// Counts what the test program allocates: through malloc and its like, and in a build with a
+// sanitizer through operator new alone.
 #pragma once
 
 #include <atomic>

@@ -131,6 +131,7 @@ TEST_F(UgpioHostTest, ALineThatCannotInterruptIsReadableAllTheSame) {
   const ContextPtr context = open(kInput);
   EXPECT_EQ(ugpio_get_value(context.get()), 1);
   EXPECT_EQ(log.count("GPIO 12 can't signal edges: its changes go unseen"), 1);
+  EXPECT_EQ(tree.slept, 0) << "the kernel will not show the file later either";
 }
 
 TEST_F(UgpioHostTest, ARefusedSenseGivesItsReason) {
@@ -169,6 +170,24 @@ TEST_F(UgpioHostTest, TheRightsToAFreshLineAreWaitedFor) {
     if (tree.slept == 1'000) {
       tree.make_line("12");
       set_line_modes(0);
+    } else if (tree.slept == 20'000) {
+      set_line_modes(0666);
+    }
+  };
+  const Unprivileged nobody;
+  EXPECT_TRUE(request(kInput));
+  EXPECT_EQ(tree.slept, 20'000);
+}
+
+TEST_F(UgpioHostTest, TheRightsToTheEdgesAreWaitedForEvenWhenTheDirectionCouldBeWritten) {
+  tree.exports = false;
+  tree.set_mode("class/gpio/export", 0666);
+  tree.on_sleep = [this] {
+    const Privileged owner;
+    if (tree.slept == 1'000) {
+      tree.make_line("12");
+      set_line_modes(0666);
+      tree.set_mode("class/gpio/gpio12/edge", 0);
     } else if (tree.slept == 20'000) {
       set_line_modes(0666);
     }

@@ -128,6 +128,17 @@ TEST_F(IoBox, RemembersWhatAnOutputWasSetToWhenTheServiceIsOutOfReach) {
   EXPECT_EQ(data()->output_value, -3);
 }
 
+TEST_F(IoBox, WithoutABusIsNotSetUpAndItsEventsAreOff) {
+  data()->connected = true;
+  g_setenv("DBUS_SYSTEM_BUS_ADDRESS", "unix:path=/nonexistent", TRUE);
+  EXPECT_FALSE(io_port_setup(port()));
+  EXPECT_TRUE(log_.took(G_LOG_LEVEL_MESSAGE,
+                        "iobox_port_setup@168: Proxy for com.kelv.IOBoxMonitor not available"));
+  EXPECT_TRUE(log_.empty());
+  EXPECT_FALSE(data()->connected);
+  EXPECT_FALSE(io_port_events_enabled(port()));
+}
+
 TEST_F(IoBox, FollowsTheSignalBeforeTheWatchButReportsNothing) {
   state_changed(kNumber, "closed");
   EXPECT_EQ(data()->state, SUPERVISED_STATE_CLOSED);
