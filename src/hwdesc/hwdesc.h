@@ -14,5 +14,8 @@ bool hwdesc_load_file(const std::string &path);
 // that fails. Without the directory: does nothing.
 void hwdesc_load_directory(const std::string &path);
 
+// Lets go of what only reading documents needs. Main thread, after the last document.
+void hwdesc_finish();
+
 // The port number of the first virtual input, if a document gave one.
 std::optional<int> hwdesc_first_virtual_input();
