@@ -330,7 +330,9 @@ bool parse(std::string_view text) {
 bool hwdesc_load_file(const std::string &path) {
   char *contents = nullptr;
   gsize length = 0;
-  if (!g_file_get_contents(path.c_str(), &contents, &length, nullptr)) {
+  // Reading a pipe or a device could go on for ever.
+  if (!g_file_test(path.c_str(), G_FILE_TEST_IS_REGULAR) ||
+      !g_file_get_contents(path.c_str(), &contents, &length, nullptr)) {
     log_critical("Couldn't load XML (%s)\n", path.c_str());
     return false;
   }

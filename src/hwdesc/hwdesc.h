@@ -6,8 +6,9 @@
 #include <optional>
 #include <string>
 
-// Reads one document into the port registry. False, with a critical message, when it could not be
-// read or is malformed; what stood before the error is kept. Main thread, at start-up.
+// Reads one document into the port registry. False, with a critical message, when it is no regular
+// file, could not be read or is malformed; what stood before the error is kept. Main thread, at
+// start-up.
 bool hwdesc_load_file(const std::string &path);
 
 // Reads the files of a directory in the order in which it lists them, and stops at the first one
