@@ -655,14 +655,6 @@ def test_other_arguments_leave_it_on(device, arguments):
     assert device.path(REGISTRY).exists()
 
 
-def test_the_name_goes_before_the_control_interface(tool):
-    with tool.device.signals("NameOwnerChanged", "org.freedesktop.DBus", "/org/freedesktop/DBus") as gone:
-        tool.device.stop()
-        gone.wait(lambda change: change[0] == "com.kelv.IOControl.State" and not change[2])
-        lost = [name for name, _old, new in gone.received if not new and not name.startswith(":")]
-    assert lost[0] == SERVICE
-
-
 # Failures that end the daemon
 
 
