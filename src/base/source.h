@@ -1,7 +1,8 @@
 // A source of the default main context that removes itself. Assigning a new id removes the source
 // held before, so a holder never has two armed at once. Main thread only.
 //
-// A callback that returns G_SOURCE_REMOVE ends its source itself: it must call forget() first.
+// A callback that returns G_SOURCE_REMOVE ends its source itself, so the holder must no longer have
+// its id by then: the callback calls forget() or reset(), or assigns another source.
 #pragma once
 
 #include <glib.h>

@@ -69,6 +69,7 @@ void load_hardware_description() {
   hwdesc_load_file(kHardwareDescription);
   legacy_remove_unfinished();
   hwdesc_load_directory(kHardwareFragments);
+  hwdesc_finish();
 }
 
 void apply_settings() {

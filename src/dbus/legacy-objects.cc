@@ -133,5 +133,6 @@ void iocontrol_conf_legacy_dbus_handle_method_call(
     const char *interface_name, const char *method_name, GVariant * /*parameters*/,
     GDBusMethodInvocation *invocation, gpointer /*user_data*/) {
   g_assert(object_path && interface_name && method_name);
-  g_object_unref(invocation);
+  g_dbus_method_invocation_return_error(invocation, G_DBUS_ERROR, G_DBUS_ERROR_UNKNOWN_METHOD,
+                                        "No such method: %s", method_name);
 }

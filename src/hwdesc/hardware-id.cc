@@ -1,5 +1,7 @@
 #include "hwdesc/hardware-id.h"
 
+#include <memory>
+
 #include "base/glib-ptr.h"
 #include "base/log.h"
 #include "base/patience.h"
@@ -9,14 +11,16 @@ namespace {
 constexpr const char *kService = "com.kelv.PolicyKitSystem";
 constexpr const char *kObject = "/com/kelv/PolicyKitSystem";
 
-// The hardware description has several documents, and each may ask anew.
-Patience &patience() {
-  static Patience instance;
-  return instance;
-}
+// Kept over the look-ups of all documents: making a proxy asks for the properties of the service,
+// which takes as long as a call when the service hangs.
+struct PolicyService {
+  GObjectPtr<GDBusProxy> proxy;
+  Patience patience;
+};
+std::unique_ptr<PolicyService> service;
 
-// The proxy asks for the properties of the service, so a service that hangs shows here already.
-GObjectPtr<GDBusProxy> make_proxy() {
+// A service that hangs shows here already.
+GObjectPtr<GDBusProxy> make_proxy(Patience &patience) {
   const std::int64_t begun = g_get_monotonic_time();
   Error error;
   GObjectPtr<GDBusProxy> proxy(
@@ -26,13 +30,13 @@ GObjectPtr<GDBusProxy> make_proxy() {
     log_user("Failed to setup proxy: %s", error.message());
     return proxy;
   }
-  patience().note_failure(proxy_owner(proxy.get()), begun, g_get_monotonic_time());
+  patience.note_failure(proxy_owner(proxy.get()), begun, g_get_monotonic_time());
   return proxy;
 }
 
-GVariantPtr ask(GDBusProxy *proxy, const char *parameter) {
+GVariantPtr ask(PolicyService &policy, const char *parameter) {
   Error error;
-  GVariantPtr reply = call_with_patience(patience(), proxy, "ReadBootblockParam",
+  GVariantPtr reply = call_with_patience(policy.patience, policy.proxy.get(), "ReadBootblockParam",
                                          g_variant_new("(s)", parameter), error.out());
   if (!reply) {
     log_info("Failed to request policykit system: %s", error.message());
@@ -46,15 +50,21 @@ GVariantPtr ask(GDBusProxy *proxy, const char *parameter) {
 }  // namespace
 
 std::optional<std::string> read_hardware_id(const char *parameter) {
-  static GObjectPtr<GDBusProxy> proxy;
-  if (!proxy) {
-    proxy = make_proxy();
+  if (!service) {
+    service = std::make_unique<PolicyService>();
   }
-  const GVariantPtr reply = proxy ? ask(proxy.get(), parameter) : nullptr;
+  if (!service->proxy) {
+    service->proxy = make_proxy(service->patience);
+  }
+  const GVariantPtr reply = service->proxy ? ask(*service, parameter) : nullptr;
   if (!reply) {
     return std::nullopt;
   }
   const char *value = nullptr;
   g_variant_get(reply.get(), "(&s)", &value);
   return value;
+}
+
+void release_hardware_id_service() {
+  service.reset();
 }

@@ -8,3 +8,7 @@
 // not answer holds the caller for 25 seconds, and at later look-ups for 0.1 seconds. None, with a
 // message, when it can't be had. Main thread, at start-up.
 std::optional<std::string> read_hardware_id(const char *parameter);
+
+// Forgets the service, which a look-up remembers for the next one: it may be another process by
+// then. Main thread.
+void release_hardware_id_service();

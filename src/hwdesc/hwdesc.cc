@@ -21,12 +21,13 @@ struct Attribute {
 };
 using Attributes = std::vector<Attribute>;
 
-// What the parser remembers between the tags of one document.
+// What the parser remembers between the tags of one document. The next document starts afresh: one
+// that breaks off within a port or a backend must not make tags of another be skipped or handed to
+// a backend.
 struct Loader {
-  bool skip_port = false;   // until the end tag of the port
-  bool in_backend = false;  // attributes go to the port's backend too
-  bool hardware_id_asked = false;
-  std::optional<std::string> hardware_id;
+  bool skip_port = false;                  // until the end tag of the port
+  bool in_backend = false;                 // attributes go to the port's backend too
+  std::optional<std::string> hardware_id;  // once it could be had
 };
 
 std::optional<int> first_virtual_input;
@@ -50,10 +51,9 @@ int parse_int(const char *text) {
 
 // --- The hardware filter ---
 
-// The service is asked once a document, also when it does not answer.
+// Asked for until there is an answer: the service may be coming up beside the daemon.
 const std::optional<std::string> &hardware_id(Loader &loader) {
-  if (!loader.hardware_id_asked) {
-    loader.hardware_id_asked = true;
+  if (!loader.hardware_id) {
     loader.hardware_id = read_hardware_id("HWID");
   }
   return loader.hardware_id;
@@ -313,6 +313,8 @@ void end_element(GMarkupParseContext * /*context*/, const gchar *name, gpointer 
 
 constexpr GMarkupParser kParser = {start_element, end_element, nullptr, nullptr, nullptr};
 
+// Ending the parse finds what is cut off, and what is empty: neither is what the maker of the
+// device wrote, and a port that is missing without a word would be hard to find.
 bool parse(std::string_view text) {
   Loader loader;
   const GMarkupContextPtr context(
@@ -328,7 +330,9 @@ bool parse(std::string_view text) {
 bool hwdesc_load_file(const std::string &path) {
   char *contents = nullptr;
   gsize length = 0;
-  if (!g_file_get_contents(path.c_str(), &contents, &length, nullptr)) {
+  // Reading a pipe or a device could go on for ever.
+  if (!g_file_test(path.c_str(), G_FILE_TEST_IS_REGULAR) ||
+      !g_file_get_contents(path.c_str(), &contents, &length, nullptr)) {
     log_critical("Couldn't load XML (%s)\n", path.c_str());
     return false;
   }
@@ -353,6 +357,10 @@ void hwdesc_load_directory(const std::string &path) {
       return;
     }
   }
+}
+
+void hwdesc_finish() {
+  release_hardware_id_service();
 }
 
 std::optional<int> hwdesc_first_virtual_input() {

@@ -31,6 +31,7 @@ struct PortListener {
   void (*action_sequence_done)(int number) = nullptr;
 };
 
-// The one table of the process. Fill slots before the first port is set up and leave them: action
-// threads read them without a lock.
+// The one table of the process. Fill slots before watches are armed and before the main loop serves
+// the first client, who may start an action sequence, and leave them: action threads read them
+// without a lock. Main thread.
 PortListener &port_listener();

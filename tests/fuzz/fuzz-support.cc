@@ -22,16 +22,17 @@ GLogWriterOutput drop_message(GLogLevelFlags /*level*/, const GLogField * /*fiel
 bool owns_no_hardware(const IOPort *ioport) {
   constexpr int virtual_backend = 0;
   constexpr int null_backend = 8;
-  constexpr int check_backend = 9;
   const int kind = io_port_get_backend(ioport);
-  return kind == virtual_backend || kind == null_backend || kind == check_backend;
+  return kind == virtual_backend || kind == null_backend || kind == kFuzzCheckBackend;
 }
 
 }  // namespace
 
 InputFile::InputFile() {
-  char folder[] = "/tmp/portd-fuzz-XXXXXX";
-  folder_ = g_mkdtemp(folder);
+  // Saving syncs, which would take most of the time on a disk.
+  const std::string parent = access("/dev/shm", W_OK) == 0 ? "/dev/shm" : "/tmp";
+  std::string folder = parent + "/portd-fuzz-XXXXXX";
+  folder_ = g_mkdtemp(folder.data());
   path_ = folder_ + "/input";
 }
 
@@ -55,6 +56,25 @@ void fuzz_initialise() {
     std::abort();
   }
   backends_register();
+}
+
+void fuzz_add_port(int number, const char *id, PortType type, int backend) {
+  const IOPortRef ioport(io_port_new());
+  io_port_set_id(ioport.get(), id);
+  io_port_set_type(ioport.get(), type);
+  io_port_set_number(ioport.get(), number);
+  io_port_set_backend(ioport.get(), backend);
+  io_port_set_flag(ioport.get(), "ioport", "true");
+  port_registry_add(ioport.get());
+}
+
+bool fuzz_apply_settings(const std::string &path) {
+  if (!param_read_configuration(path)) {
+    return false;
+  }
+  port_registry_for_each([](IOPort *ioport) { param_get_conf_vals(ioport); });
+  param_free_configuration();
+  return true;
 }
 
 void fuzz_exercise_ports() {

@@ -1,42 +1,31 @@
 // Any bytes as a settings file, read into one port of each type and saved back.
+#include <cstdlib>
+
 #include "fuzz-support.h"
 #include "port/ioport.h"
 #include "port/port-registry.h"
 #include "settings/param.h"
-
-namespace {
-
-void add_port(const char *id, PortType type) {
-  constexpr int check_backend = 9;
-  static int number = 0;
-  const IOPortRef ioport(io_port_new());
-  io_port_set_id(ioport.get(), id);
-  io_port_set_type(ioport.get(), type);
-  io_port_set_number(ioport.get(), number++ % 3);
-  io_port_set_backend(ioport.get(), check_backend);
-  io_port_set_flag(ioport.get(), "ioport", "true");
-  port_registry_add(ioport.get());
-}
-
-}  // namespace
+#include "support/fake-supervised.h"
 
 extern "C" int LLVMFuzzerInitialize(int * /*argc*/, char *** /*argv*/) {
   fuzz_initialise();
+  register_fake_supervised();
   return 0;
 }
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size) {
   static InputFile file;
   file.write(data, size);
-  add_port("in", PORT_INPUT);
-  add_port("out", PORT_OUTPUT);
-  add_port("both", PORT_CONFIGURABLE);
-  if (param_read_configuration(file.path())) {
-    port_registry_for_each([](IOPort *ioport) { param_get_conf_vals(ioport); });
-    param_free_configuration();
-  }
+  fuzz_add_port(0, "in", PORT_INPUT, kFuzzCheckBackend);
+  fuzz_add_port(1, "out", PORT_OUTPUT, kFuzzCheckBackend);
+  fuzz_add_port(2, "both", PORT_CONFIGURABLE, kFuzzCheckBackend);
+  fuzz_add_port(3, "line", PORT_INPUT, kFakeSupervisedKind);
+  const bool readable = fuzz_apply_settings(file.path());
   port_registry_assign_default_names();
   param_save_all(file.path());
+  if (readable && !fuzz_apply_settings(file.path())) {
+    std::abort();
+  }
   port_registry_drop_all();
   return 0;
 }

@@ -362,6 +362,34 @@ def test_a_directory_as_document(device):
     assert device.call("GetPortProps") == (0, [])
 
 
+def test_a_pipe_as_document_does_not_hold_the_start(device):
+    device.allow_critical(LOAD_FAILURE)
+    os.mkfifo(device.path("/usr/share/portd/conf.xml"))
+    device.start()
+    assert device.log_count(f"CRITICAL: portd: {LOAD_FAILURE} (/usr/share/portd/conf.xml)") == 1
+    assert identifiers(device) == []
+
+
+def test_a_pipe_as_fragment_does_not_hold_the_start(device):
+    device.allow_critical(LOAD_FAILURE)
+    device.conf(hwdesc(port("a", 0)))
+    os.mkfifo(device.path("/etc/portd.d/pipe.xml"))
+    device.start()
+    assert device.log_count(f"CRITICAL: portd: {LOAD_FAILURE} (/etc/portd.d//pipe.xml)") == 1
+    assert identifiers(device) == ["a"]
+
+
+def test_links_to_documents_are_followed(device):
+    device.allow_critical(LOAD_FAILURE)
+    device.write("/usr/share/portd/real.xml", hwdesc(port("a", 0)))
+    device.path("/usr/share/portd/conf.xml").symlink_to("real.xml")
+    os.mkfifo(device.path("/usr/share/portd/pipe"))
+    device.path("/etc/portd.d/link.xml").symlink_to("/usr/share/portd/pipe")
+    device.start()
+    assert device.log_count(f"{LOAD_FAILURE} (/etc/portd.d//link.xml)") == 1
+    assert identifiers(device) == ["a"]
+
+
 @pytest.mark.parametrize("tenth", range(1, 10))
 def test_a_document_cut_off(device, tenth):
     device.allow_critical(PARSE_FAILURE)

@@ -63,7 +63,24 @@ def test_without_the_service_every_port_is_kept(device):
     device.start()
     assert ids(device) == EVERYTHING
     assert device.log_count(NOT_HAD) == 3
-    assert REFUSED in device.log()
+    assert device.log_count(REFUSED) == 3
+
+
+def test_a_port_is_filtered_by_the_first_answer_that_is_one(device, neighbourhood):
+    code = "self.asked = getattr(self, 'asked', 0) + 1; ret = 'A1' if self.asked > 1 else 1 / 0"
+    service = play(neighbourhood, device, "s", code)
+    device.start()
+    assert ids(device) == {"always", "same", "listed"}
+    assert device.log_count(NOT_HAD) == device.log_count(REFUSED) == 1
+    assert len(service.calls(PATH, "ReadBootblockParam")) == 2
+
+
+def test_the_service_is_watched_only_while_the_ports_are_loaded(device, neighbourhood):
+    play(neighbourhood, device, "s", "ret = 'A1'")
+    device.start()
+    bus, stats = "org.freedesktop.DBus", "org.freedesktop.DBus.Debug.Stats"
+    rules = device.bus.call(bus, "/org/freedesktop/DBus", stats, "GetAllMatchRules")
+    assert not [rule for of_one in rules.values() for rule in of_one if NAME in rule]
 
 
 def test_an_error_as_the_answer_keeps_every_port(device, neighbourhood):
@@ -71,7 +88,7 @@ def test_an_error_as_the_answer_keeps_every_port(device, neighbourhood):
     device.start()
     assert ids(device) == EVERYTHING
     assert device.log_count(NOT_HAD) == 3
-    assert "no boot block" in device.log()
+    assert sum("no boot block" in line for line in device.log().splitlines()) == 3
 
 
 @pytest.mark.parametrize("signature, code", [("", ""), ("i", "ret = 7"), ("ss", "ret = ('A1', 'A1')"),

@@ -14,6 +14,13 @@ MAPPINGS = (
     "/etc/service_registry/services.d/portd_service_registry.conf",
     "/etc/legacyconfig/legacymappings.d/portd.xml",
 )
+CONTROL = "com.kelv.IOControl.State"
+CONNECTOR = "com.kelv.PCD.Connector"
+SUPERVISED = "com.kelv.IOSupervised.Supervised"
+LEGACY = "com.kelv.Configuration.Legacy.IOControl1.IOPort"
+DISABLED = "--disable_legacy_interface"
+# Where only one user id exists, that is the one which the service account would have.
+ACCOUNT = PCD_ID if is_real_root() else os.geteuid()
 DOOR = hwdesc(port("door", 0, names={"input": "Door"}))
 
 
@@ -25,12 +32,34 @@ def door(device):
 
 
 def test_owns_its_names_while_it_runs(door):
-    names = ("com.kelv.IOControl.State", "com.kelv.PCD.Connector")
+    names = (CONTROL, CONNECTOR, SUPERVISED, LEGACY)
     door.start()
     for name in names:
         door.wait_name(name)
     door.stop()
     wait_for(lambda: not any(door.bus.has_owner(name) for name in names), "release of the names")
+
+
+def name_changes(device):
+    return device.signals("NameOwnerChanged", "org.freedesktop.DBus", "/org/freedesktop/DBus")
+
+
+def test_gives_its_names_up_from_the_newest_interface_to_the_oldest(door):
+    door.start()
+    for name in (CONTROL, CONNECTOR, SUPERVISED, LEGACY):
+        door.wait_name(name)
+    with name_changes(door) as changes:
+        door.stop()
+        changes.wait_count(5)
+    lost = [name for name, _old, new in changes.received if not new and not name.startswith(":")]
+    assert lost == [LEGACY, SUPERVISED, CONTROL, CONNECTOR]
+
+
+def test_takes_its_names_as_the_service_account(door):
+    door.start()
+    for name in (CONTROL, CONNECTOR, SUPERVISED, LEGACY):
+        door.wait_name(name)
+        assert door.bus.bus_call("GetConnectionUnixUser", "s", name) == ACCOUNT, name
 
 
 def test_sighup_is_one_line_and_nothing_else(door):
@@ -98,17 +127,18 @@ def test_without_the_group_it_runs_on_as_root(make_device):
 
 
 def test_the_settings_file_goes_to_the_service_account(door):
-    owner = PCD_ID if is_real_root() else os.geteuid()
     target = door.write("/etc/portd/portd.conf", "[door]\ninput_name=Gate\n")
     door.start()
-    assert (target.stat().st_uid, target.stat().st_gid) == (owner, owner)
+    assert (target.stat().st_uid, target.stat().st_gid) == (ACCOUNT, ACCOUNT)
     door.call("SetName", "ubs", 0, True, "Front door")
     wait_for(lambda: "Front door" in door.read_settings(), "the save")
-    assert (target.stat().st_uid, target.stat().st_gid) == (owner, owner)
+    assert (target.stat().st_uid, target.stat().st_gid) == (ACCOUNT, ACCOUNT)
 
 
 def test_a_settings_file_that_it_made_can_be_saved_to(door):
     door.start()
+    made = door.path("/etc/portd/portd.conf").stat()
+    assert (made.st_uid, made.st_gid) == (ACCOUNT, ACCOUNT)
     door.call("SetName", "ubs", 0, True, "Front door")
     wait_for(lambda: "Front door" in door.read_settings(), "the save")
     door.restart()
@@ -118,7 +148,7 @@ def test_a_settings_file_that_it_made_can_be_saved_to(door):
 @pytest.mark.parametrize("text", ["no group\n", "[door\ninput_name=x\n", "[door]\nno value\n"])
 def test_a_malformed_settings_file_ends_it_with_status_1(door, text):
     door.settings(text)
-    with door.signals("NameOwnerChanged", "org.freedesktop.DBus", "/org/freedesktop/DBus") as names:
+    with name_changes(door) as names:
         door.start(wait=False)
         assert door.wait_exit() == 1
         # A name that was owned for an instant would show before this one.
@@ -131,6 +161,18 @@ def test_a_malformed_settings_file_ends_it_with_status_1(door, text):
     assert door.read_settings() == text
 
 
+def test_settings_that_cannot_be_read_end_it_before_it_changes_anything(make_device):
+    device = make_device(pcd_user=False)
+    device.conf(DOOR)
+    device.settings("no group\n")
+    device.start(wait=False)
+    assert device.wait_exit() == 1
+    assert not any(device.path(mapping).exists() for mapping in MAPPINGS)
+    # Without the account, a privilege drop would not have stayed unsaid.
+    assert device.stderr().startswith("Could not read key file: ")
+    assert device.stderr().count("\n") == 1
+
+
 def test_a_directory_as_settings_file_ends_it_with_status_1(door):
     door.mkdir("/etc/portd/portd.conf")
     door.start(wait=False)
@@ -140,18 +182,22 @@ def test_a_directory_as_settings_file_ends_it_with_status_1(door):
 
 
 @pytest.mark.parametrize(
-    "arguments",
-    [(), ("--disable_legacy_interface",), ("-v", "--disable_legacy_interface"), ("--help",)],
+    "arguments, legacy",
+    [
+        ((), True),
+        ((DISABLED,), False),
+        ((DISABLED, "-v"), False),
+        (("-v", DISABLED), True),
+        (("--help",), True),
+    ],
 )
-def test_starts_whatever_the_command_line_says(door, arguments):
+def test_only_the_first_argument_can_switch_the_legacy_interface_off(door, arguments, legacy):
     door.start(*arguments)
     assert door.call("GetNbrPorts") == (1, 0)
-
-
-def test_without_the_legacy_interface_it_writes_no_mappings(door):
-    door.start("--disable_legacy_interface")
+    # Its name comes before the one that the start was awaited by.
+    assert door.bus.has_owner(LEGACY) == legacy
     door.stop()
-    assert not any(door.path(mapping).exists() for mapping in MAPPINGS)
+    assert [door.path(mapping).exists() for mapping in MAPPINGS] == [legacy, legacy]
 
 
 def test_earlier_settings_are_merged_once(door):
@@ -180,12 +226,13 @@ def test_earlier_settings_stay_without_the_export(door):
     assert door.path(EARLIER).exists()
 
 
-def test_an_export_that_is_no_file_does_not_count(door):
-    door.mkdir(EXPORT)
+@pytest.mark.parametrize("make", [os.mkdir, os.mkfifo])
+def test_an_export_that_is_no_file_does_not_count(door, make):
+    make(door.path(EXPORT))
     door.write(EARLIER, "[door]\ninput_name=Old name\ninput_activelow=true\n")
     door.start()
     assert door.call("GetNames", "u", 0) == ("Door", "")
-    assert door.path(EARLIER).exists() and door.path(EXPORT).is_dir()
+    assert door.path(EARLIER).exists() and not door.path(EXPORT).is_file()
 
 
 def test_unreadable_earlier_settings_are_left_alone(door):
@@ -198,5 +245,7 @@ def test_unreadable_earlier_settings_are_left_alone(door):
 
 def test_the_bus_going_away_is_a_regular_end(door):
     door.start()
+    door.wait_name(LEGACY)
     door.bus.kill()
     assert door.wait_exit() == 0
+    assert door.log_count("WARNING: portd: Could not release DBus name: ") == 1

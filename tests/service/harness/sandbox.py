@@ -152,6 +152,13 @@ class Sandbox:
             start_new_session=True,
         )
 
+    def make_read_only(self, folder: str) -> None:
+        """Has the programs inside see `folder` empty and not writable from now on, whoever they are."""
+        command = ["mount", "-n", "-t", "tmpfs", "-o", "ro", "tmpfs", folder]
+        mount = self.spawn(command, {"PATH": os.environ["PATH"]}, subprocess.DEVNULL, subprocess.PIPE)
+        _, reason = mount.communicate()
+        assert mount.returncode == 0, reason
+
     def stop(self) -> None:
         """Ends everything that runs in the namespace."""
         if self._holder is None:

@@ -5,35 +5,55 @@
 
 #include "dbus/iocontrol-conf-legacy-dbus.h"
 #include "dbus/legacy-controller.h"
+#include "dbus/legacy-names.h"
 #include "fixture.h"
 
 namespace {
 
-// A connection without a bus, and without anybody who listens at its other end.
+GObjectPtr<GDBusConnection> connect_to(int fd) {
+  const GObjectPtr<GSocket> socket(g_socket_new_from_fd(fd, nullptr));
+  const GObjectPtr<GSocketConnection> stream(
+      g_socket_connection_factory_create_connection(socket.get()));
+  return GObjectPtr<GDBusConnection>(g_dbus_connection_new_sync(
+      G_IO_STREAM(stream.get()), nullptr, G_DBUS_CONNECTION_FLAGS_NONE, nullptr, nullptr, nullptr));
+}
+
+// A connection without a bus, and the client at its other end.
 class Wire {
  public:
   Wire() {
-    socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends_.data());
-    const GObjectPtr<GSocket> socket(g_socket_new_from_fd(ends_[0], nullptr));
-    const GObjectPtr<GSocketConnection> stream(
-        g_socket_connection_factory_create_connection(socket.get()));
-    connection_.reset(g_dbus_connection_new_sync(G_IO_STREAM(stream.get()), nullptr,
-                                                 G_DBUS_CONNECTION_FLAGS_NONE, nullptr, nullptr,
-                                                 nullptr));
+    std::array<int, 2> ends{};
+    socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends.data());
+    connection_ = connect_to(ends[0]);
+    client_ = connect_to(ends[1]);
   }
   ~Wire() {
     g_dbus_connection_close_sync(connection_.get(), nullptr, nullptr);
-    close(ends_[1]);
+    g_dbus_connection_close_sync(client_.get(), nullptr, nullptr);
   }
   Wire(const Wire &) = delete;
   Wire &operator=(const Wire &) = delete;
 
   GDBusConnection *connection() const { return connection_.get(); }
+  GDBusConnection *client() const { return client_.get(); }
 
  private:
-  std::array<int, 2> ends_{};
   GObjectPtr<GDBusConnection> connection_;
+  GObjectPtr<GDBusConnection> client_;
 };
+
+// The answer to a call: none as long as `done` is false.
+struct Answer {
+  bool done = false;
+  Error error;
+};
+
+void take_answer(GObject *client, GAsyncResult *result, gpointer user_data) {
+  auto &answer = *static_cast<Answer *>(user_data);
+  const GVariantPtr reply(
+      g_dbus_connection_call_finish(G_DBUS_CONNECTION(client), result, answer.error.out()));
+  answer.done = true;
+}
 
 class ObjectsTest : public LegacyTest {
  protected:
@@ -83,6 +103,23 @@ TEST_F(ObjectsTest, object_that_is_there_already) {
   EXPECT_TRUE(said.starts_with("iocontrol_conf_legacy_dbus_register_object@487: Error: \""))
       << said;
   EXPECT_TRUE(said.ends_with("\" when registering DBUS object for port 3\n")) << said;
+  unreg_port_objects(controller_);
+}
+
+TEST_F(ObjectsTest, method_call_gets_an_error_and_does_not_wait) {
+  controller_.introspection = legacy_introspection_parse(
+      "<node><interface name='com.kelv.Odd'><method name='Act'/></interface></node>");
+  ASSERT_TRUE(iocontrol_conf_legacy_dbus_register_object(controller_, 0, LEGACY_INTERFACE_PORT));
+  constexpr int limit_ms = 10'000;
+  Answer answer;
+  g_dbus_connection_call(wire_.client(), nullptr, legacy_object_path(0).c_str(), "com.kelv.Odd",
+                         "Act", nullptr, nullptr, G_DBUS_CALL_FLAGS_NONE, limit_ms, nullptr,
+                         take_answer, &answer);
+  while (!answer.done) {
+    g_main_context_iteration(nullptr, TRUE);
+  }
+  EXPECT_TRUE(answer.error.matches(G_DBUS_ERROR, G_DBUS_ERROR_UNKNOWN_METHOD))
+      << answer.error.message();
   unreg_port_objects(controller_);
 }
 

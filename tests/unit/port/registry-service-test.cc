@@ -137,6 +137,39 @@ TEST_F(RegistryService, FindsParkedPortsByTheSameRules) {
   EXPECT_EQ(port_registry_find_parked(3), nullptr);
 }
 
+// A list is searched for the port that entered it first.
+TEST_F(RegistryService, FindsThePortThatWasParkedFirstOfTwoWithOneNumber) {
+  const auto one = port("one", 3).optional().set_up_and_registered();
+  const auto two = port("two", 3).optional().set_up_and_registered();
+  for (const auto &[first, second] : {std::pair(one.get(), two.get()), {two.get(), one.get()}}) {
+    port_registry_park(first);
+    port_registry_park(second);
+    EXPECT_EQ(port_registry_find_parked(3).get(), first);
+    EXPECT_EQ(port_registry_retry_parked(), 2U);
+  }
+}
+
+// Start-up walks from the newest port to the oldest.
+TEST_F(RegistryService, ParksTheNewestOfThePortsThatFailFirst) {
+  add(failing("older", 3).optional());
+  add(failing("newer", 3).optional());
+  port_registry_setup_all();
+  EXPECT_EQ(id_of(port_registry_find_parked(3)), "newer");
+}
+
+// Each list is filled at its front, so both ways turn the order round.
+TEST_F(RegistryService, PutsParkedPortsInFrontOfOnesThatWereParkedBefore) {
+  for (const char *id : {"a", "b", "c"}) {
+    add(port(id, 0).optional());
+  }
+  port_registry_setup_all();
+  for (const char *id : {"b", "a", "c"}) {
+    port_registry_park(port_registry_get_by_id(id).get());
+  }
+  EXPECT_EQ(port_registry_retry_parked(), 3U);
+  EXPECT_EQ(ids_in_order(), (Lines{"b", "a", "c"}));
+}
+
 TEST_F(RegistryService, ParksAPortOnRequestWhenItIsOptional) {
   const auto optional = port("o", 0).optional().set_up_and_registered();
   const auto needed = port("n", 1).set_up_and_registered();

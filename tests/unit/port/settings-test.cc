@@ -239,6 +239,24 @@ TEST_F(PortSense, OfAnInputLetsItsNextEventsPassTheRepeatFilter) {
   EXPECT_TRUE(io_port_events(port.get()).front().filter_reset);
 }
 
+TEST_F(PortSense, OfAnOutputLetsItsNextEventsPassTheRepeatFilter) {
+  const auto port = PortBuilder()
+                        .output()
+                        .event(event_for_outputs("siren"))
+                        .event(event_for_inputs("alarm"))
+                        .set_up();
+  EXPECT_TRUE(io_port_set_activelow(port.get(), true, false));
+  for (const auto &event : io_port_events(port.get())) {
+    EXPECT_TRUE(event.filter_reset) << *event.name;
+  }
+}
+
+TEST_F(PortSense, OfTheOtherRoleLetsTheNextEventsPassToo) {
+  const auto port = PortBuilder().configurable_input().event(event_for_inputs("alarm")).set_up();
+  EXPECT_TRUE(io_port_set_activelow(port.get(), true, false));
+  EXPECT_TRUE(io_port_events(port.get()).front().filter_reset);
+}
+
 TEST_F(PortSense, ThatIsGivenAgainDoesNothing) {
   const auto port = PortBuilder().configurable_input().event(event_for_inputs("alarm")).set_up();
   EXPECT_TRUE(io_port_set_activelow(port.get(), false, true));

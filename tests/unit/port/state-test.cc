@@ -92,6 +92,16 @@ TEST_F(PortState, TellsNothingWhenTheLineDoesNotFollow) {
   EXPECT_EQ(listener.heard(), Lines{});
 }
 
+TEST_F(PortState, DrivesAnOutputThatIsSilencedAndTellsNothing) {
+  const auto port = PortBuilder().output().event(event_for_outputs("siren")).set_up();
+  io_port_set_events_enabled(port.get(), false);
+  (void)listener.heard();
+  EXPECT_TRUE(io_port_set_state(port.get(), true));
+  EXPECT_EQ(check_record(port).state, 1);
+  EXPECT_TRUE(io_port_get_state(port.get()));
+  EXPECT_EQ(listener.heard(), Lines{});
+}
+
 TEST_F(PortState, DrivesAConfigurablePortWhileItIsAnOutput) {
   const auto port = PortBuilder().configurable_output().set_up();
   EXPECT_TRUE(io_port_set_state(port.get(), true));

@@ -1,0 +1,91 @@
+// Any bytes as the export of an older parameter store. What was taken from it must come back from
+// the settings file that it is saved to.
+#include <cstdlib>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "base/glib-ptr.h"
+#include "fuzz-support.h"
+#include "port/ioport.h"
+#include "port/port-registry.h"
+#include "settings/param-legacy.h"
+#include "settings/param.h"
+
+namespace {
+
+struct OutputSettings {
+  int button;
+  int mode;
+  std::uint32_t pulse_time;
+  std::int32_t delay_time;
+
+  bool operator==(const OutputSettings &other) const = default;
+};
+
+struct Settings {
+  bool input;
+  bool activelow_input;
+  bool activelow_output;
+  std::optional<std::string> input_name;
+  std::optional<std::string> output_name;
+  std::optional<OutputSettings> output;  // none: the port has no such side, so nothing is saved
+
+  bool operator==(const Settings &other) const = default;
+};
+
+Settings settings_of(const IOPort *ioport) {
+  Settings settings{.input = io_port_direction_input(ioport),
+                    .activelow_input = io_port_get_activelow(ioport, true),
+                    .activelow_output = io_port_get_activelow(ioport, false),
+                    .input_name = {},
+                    .output_name = {},
+                    .output = {}};
+  io_port_get_names(ioport, &settings.input_name, &settings.output_name);
+  if (io_port_get_type(ioport) != PORT_INPUT) {
+    settings.output = {.button = io_port_get_button(ioport),
+                       .mode = io_port_get_mode(ioport),
+                       .pulse_time = io_port_get_pulse_time(ioport),
+                       .delay_time = io_port_get_delay_time(ioport)};
+  }
+  return settings;
+}
+
+std::vector<Settings> all_settings() {
+  std::vector<Settings> all;
+  port_registry_for_each([&](IOPort *ioport) { all.push_back(settings_of(ioport)); });
+  return all;
+}
+
+void add_ports() {
+  fuzz_add_port(0, "in", PORT_INPUT, kFuzzCheckBackend);
+  fuzz_add_port(1, "out", PORT_OUTPUT, kFuzzCheckBackend);
+  fuzz_add_port(2, "both", PORT_CONFIGURABLE, kFuzzCheckBackend);
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerInitialize(int * /*argc*/, char *** /*argv*/) {
+  fuzz_initialise();
+  return 0;
+}
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size) {
+  static InputFile file;
+  file.write(data, size);
+  add_ports();
+  Error ignored;
+  param_import_parhand(file.path().c_str(), ignored.out());
+  port_registry_assign_default_names();
+  const auto imported = all_settings();
+  file.write(data, 0);
+  param_save_all(file.path());
+  port_registry_drop_all();
+
+  add_ports();
+  if (!fuzz_apply_settings(file.path()) || all_settings() != imported) {
+    std::abort();
+  }
+  port_registry_drop_all();
+  return 0;
+}
