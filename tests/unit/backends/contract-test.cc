@@ -1,5 +1,8 @@
 // What the port layer may expect of every backend. A backend is put under the contract with a row
 // in contract-fixture.cc.
+#include <fcntl.h>
+
+#include <algorithm>
 #include <set>
 #include <string>
 #include <vector>
@@ -171,6 +174,22 @@ TEST_P(Backend, WatchesTheInputAgainThatWasAnOutput) {
     EXPECT_TRUE(io_port_set_direction(port.get(), true));
   }
   EXPECT_EQ(held(), armed);
+}
+
+// The descriptors that a second set-up opens get other numbers than those of the first, so that one
+// of the first that somebody still waits for is found out.
+TEST_P(Backend, CanBeSetUpAgainWhileItIsWatched) {
+  UniqueFd lowest(open("/dev/null", O_RDONLY | O_CLOEXEC));
+  const auto port = watched();
+  const Held armed = held();
+  lowest.reset();
+  EXPECT_TRUE(io_port_setup(port.get()));
+  iterate();
+  EXPECT_EQ(reports(), Words{});
+  EXPECT_TRUE(std::ranges::includes(armed.watched, watched_files()));
+  io_port_set_watch(port.get());
+  EXPECT_EQ(held(), armed);
+  EXPECT_EQ(reports_of_activation(port), one_report());
 }
 
 // --- Out of service ---
