@@ -240,6 +240,20 @@ TEST_P(Backend, ComesIntoServiceWhenItsHardwareAppears) {
   EXPECT_EQ(reports_of_activation(port), one_report());
 }
 
+TEST_P(Backend, LosesItsHardwareAndGetsItBack) {
+  const auto port = watched();
+  vanish();
+  (void)io_port_setup(port.get());
+  io_port_set_watch(port.get());
+  (void)io_port_get_state(port.get());
+  iterate();
+  io_port_drop(port.get());
+  appear();
+  EXPECT_TRUE(io_port_setup(port.get()));
+  io_port_set_watch(port.get());
+  EXPECT_EQ(reports_of_activation(port), one_report());
+}
+
 TEST_P(Backend, FreesADroppedPortOnce) {
   auto port = set_up();
   io_port_drop(port.get());
