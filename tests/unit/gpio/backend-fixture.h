@@ -20,13 +20,11 @@ class BackendTest : public PortFixture {
   // What the loader does for a port element, short of setting it up.
   IOPort *make_port(const char *backend, PortType type, const std::vector<Property> &properties) {
     PortBuilder builder;
-    builder.id("terminal").backend(io_port_backend_kind(backend).value());
+    builder.id("terminal").type(type).backend(io_port_backend_kind(backend).value());
     for (const auto &property : properties) {
       builder.property(property.section, property.key, property.value);
     }
     port_ = builder.build();
-    io_port_set_type(port(), type);
-    io_port_restore_direction(port(), type != PORT_OUTPUT);
     return port();
   }
   IOPort *port() const { return port_.get(); }
