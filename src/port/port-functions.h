@@ -22,7 +22,8 @@ struct PortBackendData {
 // operation runs on the main thread.
 struct PortFunctions {
   // Brings the hardware up; an output starts at the raw level `initial_level`. False: it could not,
-  // and the reason is in the log.
+  // and the reason is in the log. Brought up already: begins anew; whether the port is still
+  // watched then is left open until its watch is armed again.
   bool (*setup)(IOPort *port, bool initial_level) = nullptr;
   // Also from action threads.
   bool (*is_supervisable)(IOPort *port) = nullptr;

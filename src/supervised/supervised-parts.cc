@@ -6,6 +6,11 @@
 
 namespace {
 
+void stop_watches(IOPort *port, const SupervisedParts &parts) {
+  supervised_set_edge_watch(port, false);
+  parts.set_line_watch(port, false);
+}
+
 bool setup_input(IOPort *port, const SupervisedParts &parts) {
   if (!supervised_request_control_pins(port, parts.sio_ctrl_optional)) {
     return false;
@@ -19,8 +24,10 @@ bool setup_input(IOPort *port, const SupervisedParts &parts) {
 
 bool supervised_setup(IOPort *port, bool initial_level, const SupervisedParts &parts) {
   SupervisedData *data = supervised_data(port);
+  if (data->initialised) {
+    stop_watches(port, parts);  // they wait for descriptors that are about to go
+  }
   data->initialised = false;
-  data->edges.stop();  // a line that is requested anew has another descriptor
   if (!supervised_check_pins(port)) {
     return false;
   }
@@ -59,8 +66,7 @@ bool supervised_turn(IOPort *port, bool input, const SupervisedParts &parts) {
   if (!supervised_data(port)->initialised) {
     return false;
   }
-  supervised_set_edge_watch(port, false);
-  parts.set_line_watch(port, false);
+  stop_watches(port, parts);
   if (input) {
     (void)supervised_drive_output(port, 0);
     return parts.set_control_pins(port);

@@ -1,76 +1,36 @@
-// What the port layer may expect of every backend. A backend is put under the contract with one
-// line in kBackends.
+// What the port layer may expect of every backend. A backend is put under the contract with a row
+// in contract-fixture.cc.
+#include <fcntl.h>
+
 #include <algorithm>
+#include <set>
 #include <string>
 #include <vector>
 
-#include "backends/tables.h"
-#include "support/port-fixture.h"
+#include "contract-fixture.h"
 
 namespace {
 
-enum class Serves { plain, supervised };
+constexpr int kVirtualKind = 0;
+constexpr int kCheckKind = 9;
+constexpr PortType kTypes[] = {PORT_INPUT, PORT_OUTPUT, PORT_CONFIGURABLE};
 
-struct BackendUnderTest {
-  const char *word;  // in the hardware description
-  MakePortFunctions make;
-  int kind;
-  Serves serves = Serves::plain;
-  PortType type = PORT_CONFIGURABLE;  // that it can be set up as
-  bool sets_up = true;                // on a host without the device's hardware
-  // What it must be told before it can be set up.
-  std::vector<CheckProperty> properties = {};
-};
+INSTANTIATE_TEST_SUITE_P(Every, Backend, testing::ValuesIn(all_backends()), name_of);
 
-const std::vector<CheckProperty> kReadableFile = {{"device", "path", "/dev/null"},
-                                                  {"device", "timeout", "1"}};
-
-const BackendUnderTest kBackends[] = {
-    {"virtual", virtual_backend_functions, 0},
-    {"sysfs", sysfs_backend_functions, 6, Serves::plain, PORT_INPUT, true, kReadableFile},
-    {"null", null_backend_functions, 8},
-    {"check", check_backend_functions, 9},
-};
-
-// Printed by GoogleTest in place of the bytes of the struct.
-void PrintTo(const BackendUnderTest &backend,  // NOLINT(readability-identifier-naming)
-             std::ostream *out) {
-  *out << backend.word;
-}
-
-class Backend : public PortFixture, public testing::WithParamInterface<BackendUnderTest> {
- protected:
-  ~Backend() override { log.forget(); }  // what a backend says of odd orders is its own affair
-
-  static IOPortRef described() {
-    PortBuilder builder;
-    builder.backend(GetParam().kind);
-    for (const auto &property : GetParam().properties) {
-      builder.property(property.section.c_str(), property.key.c_str(), property.value.c_str());
+TEST_F(Bench, EveryBackendIsUnderTheContract) {
+  constexpr int beyond = 100;
+  std::set<int> registered;
+  for (int kind = -beyond; kind < beyond; ++kind) {
+    if (io_port_has_backend(make_port(kind, PORT_INPUT, {}).get())) {
+      registered.insert(kind);
     }
-    auto port = builder.build();
-    io_port_set_type(port.get(), GetParam().type);
-    return port;
   }
-  static const PortFunctions &table() {
-    const IOPortRef port(io_port_new());
-    const PortFunctions *functions = GetParam().make(port.get());
-    io_port_set_backend_data(port.get(), nullptr);
-    return *functions;
+  std::set<int> under_test;
+  for (const auto &row : all_backends()) {
+    under_test.insert(row.kind);
   }
-  static bool is_watched(const IOPort *port) {
-    return g_main_context_find_source_by_user_data(nullptr, const_cast<IOPort *>(port)) != nullptr;
-  }
-};
-
-// GoogleTest takes letters, digits and underscores.
-std::string word_of(const testing::TestParamInfo<BackendUnderTest> &backend) {
-  std::string word = backend.param.word;
-  std::replace(word.begin(), word.end(), '-', '_');
-  return word;
+  EXPECT_EQ(under_test, registered);
 }
-
-INSTANTIATE_TEST_SUITE_P(Every, Backend, testing::ValuesIn(kBackends), word_of);
 
 // --- The table ---
 
@@ -92,15 +52,13 @@ TEST_P(Backend, ServesWhatEveryPortNeeds) {
 }
 
 TEST_P(Backend, OffersSupervisionOnlyWhereItHasIt) {
-  const bool offers = GetParam().serves == Serves::supervised;
+  const bool offers = GetParam().supervisable;
   EXPECT_EQ(table().is_supervisable != nullptr, offers);
   EXPECT_EQ(table().set_supervised != nullptr, offers);
   EXPECT_EQ(table().get_supervised_ranges != nullptr, offers);
   EXPECT_EQ(table().set_supervised_ranges != nullptr, offers);
   EXPECT_EQ(table().get_supervised_readout != nullptr, offers);
-  if (!offers) {
-    EXPECT_EQ(table().drop, nullptr);
-  }
+  EXPECT_EQ(table().drop != nullptr, GetParam().drops);
 }
 
 TEST_P(Backend, HasOneTableForAllItsPorts) {
@@ -121,12 +79,12 @@ TEST_P(Backend, GivesEachPortARecordOfItsOwnOnce) {
 // --- A port that nothing was told about ---
 
 TEST_P(Backend, ReadsInactiveBeforeSetUp) {
-  const auto port = PortBuilder().backend(GetParam().kind).build();
-  EXPECT_FALSE(io_port_get_state(port.get()));
+  EXPECT_FALSE(io_port_get_state(fresh().get()));
+  EXPECT_FALSE(io_port_get_state(described().get()));
 }
 
 TEST_P(Backend, EnduresEveryRequestOnFreshData) {
-  const auto port = PortBuilder().backend(GetParam().kind).build();
+  const auto port = fresh();
   (void)table().get_state(port.get());
   table().set_state(port.get(), 1);
   table().set_state(port.get(), 0);
@@ -135,55 +93,52 @@ TEST_P(Backend, EnduresEveryRequestOnFreshData) {
   table().start_watch(port.get());
 }
 
-TEST_P(Backend, CanBeFreedFresh) {
-  auto port = PortBuilder().backend(GetParam().kind).build();
-  port.reset();
+TEST_P(Backend, EnduresEveryRequestToAFreshPortOfAnyType) {
+  for (const PortType type : kTypes) {
+    const auto port = fresh(type);
+    io_port_set_watch(port.get());
+    EXPECT_FALSE(io_port_set_state(port.get(), true));
+    EXPECT_EQ(io_port_set_direction(port.get(), false), type == PORT_CONFIGURABLE);
+    io_port_drop(port.get());
+    io_port_set_watch(port.get());
+  }
 }
 
 TEST_P(Backend, EnduresASetUpThatWasToldNothing) {
-  for (const PortType type : {PORT_INPUT, PORT_OUTPUT, PORT_CONFIGURABLE}) {
-    const auto port = PortBuilder().backend(GetParam().kind).build();
-    io_port_set_type(port.get(), type);
+  for (const PortType type : kTypes) {
+    const auto port = fresh(type);
     (void)io_port_setup(port.get());
     (void)io_port_get_state(port.get());
     io_port_set_watch(port.get());
+    iterate();
   }
 }
 
 TEST_P(Backend, EnduresAttributesThatItDoesNotKnow) {
   const auto port = described();
-  for (const char *section : {"", "backend", "device", "input", "no-such-section"}) {
+  for (const char *section :
+       {"", "backend", "device", "input", "output", "io_ctrl", "range", "no-such-section"}) {
     for (const char *value : {"", "-1", "true", "99999999999999999999", "\xC3\xA5"}) {
       io_port_set_backend_property(port.get(), section, "no-such-key", value);
       io_port_set_backend_property(port.get(), section, "", value);
     }
   }
-  EXPECT_EQ(io_port_setup(port.get()), GetParam().sets_up);
+  EXPECT_TRUE(io_port_setup(port.get()));
 }
 
 TEST_P(Backend, EnduresAttributesAfterSetUp) {
-  const auto port = described();
-  (void)io_port_setup(port.get());
-  for (const auto &property : GetParam().properties) {
-    io_port_set_backend_property(port.get(), property.section.c_str(), property.key.c_str(),
-                                 property.value.c_str());
+  const auto port = watched();
+  for (const auto &[section, key, value] : (this->*GetParam().properties)()) {
+    io_port_set_backend_property(port.get(), section, key, value.c_str());
   }
-  (void)io_port_get_state(port.get());
+  EXPECT_EQ(reports_of_activation(port), one_report());
 }
 
 // --- In service ---
 
-TEST_P(Backend, SetsUpAndCanBeSetUpAgain) {
-  const auto port = described();
-  EXPECT_EQ(io_port_setup(port.get()), GetParam().sets_up);
-  EXPECT_EQ(io_port_setup(port.get()), GetParam().sets_up);
-  EXPECT_EQ(io_port_is_set_up(port.get()), GetParam().sets_up);
-}
-
 TEST_P(Backend, ServesAPortFromSetUpToItsEnd) {
-  const auto port = described();
-  (void)io_port_setup(port.get());
-  io_port_set_watch(port.get());
+  const auto port = watched();
+  EXPECT_TRUE(io_port_is_set_up(port.get()));
   EXPECT_FALSE(io_port_get_state(port.get()));
   if (GetParam().type == PORT_CONFIGURABLE) {
     EXPECT_TRUE(io_port_set_direction(port.get(), false));
@@ -193,52 +148,122 @@ TEST_P(Backend, ServesAPortFromSetUpToItsEnd) {
   }
 }
 
-TEST_P(Backend, WatchesAPortOnceHoweverOftenItIsArmed) {
-  auto port = described();
-  (void)io_port_setup(port.get());
-  io_port_set_watch(port.get());
-  io_port_set_watch(port.get());
-  io_port_set_watch(port.get());
-  const IOPort *gone = port.get();
-  port.reset();
-  EXPECT_FALSE(is_watched(gone));
+TEST_P(Backend, ReportsAChangeOfItsInputOnce) {
+  EXPECT_EQ(reports_of_activation(watched()), one_report());
 }
 
-TEST_P(Backend, EndsItsWatchWhenThePortIsDropped) {
-  const auto port = described();
-  (void)io_port_setup(port.get());
+TEST_P(Backend, ReportsNothingBeforeItIsWatched) {
+  EXPECT_EQ(reports_of_activation(set_up()), Words{});
+}
+
+TEST_P(Backend, WatchesAPortOnceHoweverOftenItIsArmed) {
+  const auto port = watched();
+  const Held armed_once = held();
   io_port_set_watch(port.get());
+  io_port_set_watch(port.get());
+  EXPECT_EQ(held(), armed_once);
+  EXPECT_EQ(reports_of_activation(port), one_report());
+}
+
+TEST_P(Backend, WatchesTheInputAgainThatWasAnOutput) {
+  const auto port = watched();
+  const Held armed = held();
+  if (GetParam().type == PORT_CONFIGURABLE) {
+    EXPECT_TRUE(io_port_set_direction(port.get(), false));
+    io_port_set_watch(port.get());
+    EXPECT_TRUE(io_port_set_direction(port.get(), true));
+  }
+  EXPECT_EQ(held(), armed);
+}
+
+// The descriptors that a second set-up opens get other numbers than those of the first, so that one
+// of the first that somebody still waits for is found out.
+TEST_P(Backend, CanBeSetUpAgainWhileItIsWatched) {
+  UniqueFd lowest(open("/dev/null", O_RDONLY | O_CLOEXEC));
+  const auto port = watched();
+  const Held armed = held();
+  lowest.reset();
+  EXPECT_TRUE(io_port_setup(port.get()));
+  iterate();
+  EXPECT_EQ(reports(), Words{});
+  EXPECT_TRUE(std::ranges::includes(armed.watched, watched_files()));
+  io_port_set_watch(port.get());
+  EXPECT_EQ(held(), armed);
+  EXPECT_EQ(reports_of_activation(port), one_report());
+}
+
+// --- Out of service ---
+
+TEST_P(Backend, GivesEverythingBackWhenThePortIsDropped) {
+  const auto port = watched();
   io_port_drop(port.get());
-  EXPECT_FALSE(is_watched(port.get()));
-  g_main_context_iteration(nullptr, FALSE);
+  expect_given_back();
+  EXPECT_EQ(reports_of_activation(port), Words{});
+}
+
+TEST_P(Backend, EnduresEveryRequestToADroppedPort) {
+  const auto port = watched();
+  io_port_drop(port.get());
+  io_port_drop(port.get());
+  io_port_set_watch(port.get());
+  EXPECT_FALSE(io_port_get_state(port.get()));
+  EXPECT_FALSE(io_port_set_state(port.get(), true));
+  EXPECT_EQ(io_port_set_direction(port.get(), false), GetParam().type == PORT_CONFIGURABLE);
+  (void)io_port_set_activelow(port.get(), true, true);
+  (void)io_port_set_activelow(port.get(), true, false);
+  expect_given_back();
 }
 
 TEST_P(Backend, BringsADroppedPortBack) {
-  const auto port = described();
+  const auto port = watched();
+  const Held armed = held();
   for (int i = 0; i < 3; ++i) {
-    EXPECT_EQ(io_port_setup(port.get()), GetParam().sets_up);
+    io_port_drop(port.get());
+    EXPECT_TRUE(io_port_setup(port.get()));
     io_port_set_watch(port.get());
-    io_port_drop(port.get());
-    io_port_drop(port.get());
-    EXPECT_FALSE(io_port_get_state(port.get()));
+    EXPECT_EQ(held(), armed);
   }
-  EXPECT_EQ(io_port_setup(port.get()), GetParam().sets_up);
+  EXPECT_EQ(reports_of_activation(port), one_report());
+}
+
+TEST_P(Backend, ComesIntoServiceWhenItsHardwareAppears) {
+  vanish();
+  const auto port = described();
+  (void)io_port_setup(port.get());
+  io_port_set_watch(port.get());
+  iterate();
+  EXPECT_EQ(reports(), Words{});
+  io_port_drop(port.get());
+  appear();
+  EXPECT_TRUE(io_port_setup(port.get()));
+  io_port_set_watch(port.get());
+  EXPECT_EQ(reports_of_activation(port), one_report());
+}
+
+TEST_P(Backend, LosesItsHardwareAndGetsItBack) {
+  const auto port = watched();
+  vanish();
+  (void)io_port_setup(port.get());
+  io_port_set_watch(port.get());
+  (void)io_port_get_state(port.get());
+  iterate();
+  io_port_drop(port.get());
+  appear();
+  EXPECT_TRUE(io_port_setup(port.get()));
+  io_port_set_watch(port.get());
+  EXPECT_EQ(reports_of_activation(port), one_report());
 }
 
 TEST_P(Backend, FreesADroppedPortOnce) {
-  auto port = described();
-  (void)io_port_setup(port.get());
+  auto port = set_up();
   io_port_drop(port.get());
   port.reset();
 }
 
 TEST_P(Backend, MakesWayForAnotherAndTakesThePortBack) {
-  const auto port = described();
-  (void)io_port_setup(port.get());
-  io_port_set_watch(port.get());
-  const int other = GetParam().kind == kCheckKind ? kVirtualKind : kCheckKind;
-  io_port_set_backend(port.get(), other);
-  EXPECT_FALSE(is_watched(port.get()));
+  const auto port = watched();
+  io_port_set_backend(port.get(), GetParam().kind == kCheckKind ? kVirtualKind : kCheckKind);
+  expect_given_back();
   EXPECT_TRUE(io_port_setup(port.get()));
   io_port_set_backend(port.get(), GetParam().kind);
   (void)table().get_state(port.get());

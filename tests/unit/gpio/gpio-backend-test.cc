@@ -10,12 +10,20 @@ using Calls = std::vector<std::string>;
 constexpr const char *kCouldNotSet = "Failed to set state on port!\n";
 constexpr const char *kCouldNotTurn = "Couldn't change direction on port!\n";
 
+const Calls kNoLineAllocated = {"Failed to allocate pin 1/(null)",
+                                "Failed to allocate pin 2/(null)",
+                                "Failed to allocate pin 3/(null)"};
+const Calls kNoLineDescribed = {"Port terminal has no input line",
+                                "Port terminal has no output line",
+                                "Port terminal has no io_ctrl line"};
+
 // --- The hardware description ---
 
 TEST_F(GpioBackendTest, AnUnknownSectionIsLoggedAndChangesNothing) {
   make(PORT_CONFIGURABLE, {{"io-ctrl", "pin", "3"}, {"Input", "pin", "1"}});
-  EXPECT_EQ(log.count("Could not parse backend data!\n"), 2);
+  EXPECT_EQ(log.take_all(G_LOG_LEVEL_WARNING, "Could not parse backend data!\n"), 2U);
   EXPECT_TRUE(io_port_setup(port()));
+  EXPECT_EQ(log.take_warnings(), kNoLineDescribed);
   EXPECT_TRUE(fake_ugpio().calls.empty());
 }
 
@@ -78,16 +86,12 @@ TEST_F(GpioBackendTest, SetUpSucceedsWhenNoLineCanBeHad) {
     line(name).request_error = EBUSY;
   }
   EXPECT_TRUE(io_port_setup(make_configurable()));
-  EXPECT_EQ(log.warnings(),
-            (Calls{"Failed to allocate pin 1/(null)", "Failed to allocate pin 2/(null)",
-                   "Failed to allocate pin 3/(null)"}));
+  EXPECT_EQ(log.take_warnings(), kNoLineAllocated);
 }
 
 TEST_F(GpioBackendTest, SetUpSucceedsWhenTheDocumentForgetsThePins) {
   EXPECT_TRUE(io_port_setup(make(PORT_CONFIGURABLE, {})));
-  EXPECT_EQ(log.warnings(),
-            (Calls{"Port terminal has no input line", "Port terminal has no output line",
-                   "Port terminal has no io_ctrl line"}));
+  EXPECT_EQ(log.take_warnings(), kNoLineDescribed);
 }
 
 // --- Levels ---
@@ -116,15 +120,15 @@ TEST_F(GpioBackendTest, AnOutputIsDrivenAndReadBack) {
   EXPECT_TRUE(io_port_set_state(port(), true));
   EXPECT_EQ(line("2").value, 1);
   EXPECT_TRUE(io_port_get_state(port()));
-  EXPECT_EQ(reported, States{true});
+  EXPECT_EQ(reported(), States{true});
 }
 
 TEST_F(GpioBackendTest, AnOutputThatCannotBeDrivenIsLogged) {
   EXPECT_TRUE(io_port_setup(make_output()));
   line("2").write_error = EIO;
   EXPECT_TRUE(io_port_set_state(port(), true));
-  EXPECT_EQ(log.count(kCouldNotSet), 1);
-  EXPECT_TRUE(reported.empty());
+  EXPECT_TRUE(log.took_warning(kCouldNotSet));
+  EXPECT_TRUE(reported().empty());
 }
 
 // --- Ports without a line ---
@@ -134,6 +138,7 @@ TEST_F(GpioBackendTest, APortWhoseLineIsRefusedLivesOn) {
   line("2").request_error = EACCES;
   line("3").request_error = EBUSY;
   EXPECT_TRUE(io_port_setup(make_configurable()));
+  EXPECT_EQ(log.take_warnings(), kNoLineAllocated);
   io_port_set_watch(port());
   EXPECT_TRUE(io_port_get_state(port()));
   EXPECT_TRUE(io_port_set_direction(port(), false));
@@ -143,20 +148,22 @@ TEST_F(GpioBackendTest, APortWhoseLineIsRefusedLivesOn) {
   EXPECT_TRUE(io_port_set_direction(port(), true));
   EXPECT_TRUE(io_port_set_activelow(port(), true, true));
   io_port_set_watch(port());
-  EXPECT_EQ(log.count(kCouldNotTurn), 2);
+  EXPECT_GE(log.take_all(G_LOG_LEVEL_WARNING, kCouldNotSet), 3U);
+  EXPECT_EQ(log.take_all(G_LOG_LEVEL_WARNING, kCouldNotTurn), 2U);
   EXPECT_EQ(seams().fd_watches.size(), 0U);
   EXPECT_EQ(serve(), 0);
 }
 
 TEST_F(GpioBackendTest, APortWhoseDocumentForgetsThePinsLivesOn) {
   EXPECT_TRUE(io_port_setup(make(PORT_CONFIGURABLE, {})));
+  EXPECT_EQ(log.take_warnings(), kNoLineDescribed);
   io_port_set_watch(port());
   EXPECT_TRUE(io_port_get_state(port()));
   EXPECT_TRUE(io_port_set_direction(port(), false));
   EXPECT_TRUE(io_port_set_state(port(), true));
   EXPECT_TRUE(io_port_set_direction(port(), true));
-  EXPECT_GE(log.count(kCouldNotSet), 3);
-  EXPECT_EQ(log.count(kCouldNotTurn), 2);
+  EXPECT_GE(log.take_all(G_LOG_LEVEL_WARNING, kCouldNotSet), 3U);
+  EXPECT_EQ(log.take_all(G_LOG_LEVEL_WARNING, kCouldNotTurn), 2U);
   EXPECT_EQ(seams().fd_watches.size(), 0U);
 }
 
@@ -166,6 +173,7 @@ TEST_F(GpioBackendTest, ALineThatDoesNotOpenReadsOneAndIsNotWatched) {
   io_port_set_watch(port());
   EXPECT_TRUE(io_port_get_state(port()));
   EXPECT_EQ(seams().fd_watches.size(), 0U);
+  EXPECT_TRUE(log.took_warning("Failed to open pin fd!"));
 }
 
 // --- Direction ---
@@ -200,7 +208,7 @@ TEST_F(GpioBackendTest, ADriverThatCannotBeSwitchedIsLogged) {
   line("3").write_error = EIO;
   EXPECT_TRUE(io_port_set_direction(port(), false));
   EXPECT_TRUE(io_port_set_direction(port(), true));
-  EXPECT_EQ(log.count(kCouldNotTurn), 2);
+  EXPECT_EQ(log.take_all(G_LOG_LEVEL_WARNING, kCouldNotTurn), 2U);
 }
 
 TEST_F(GpioBackendTest, ReadsFollowTheDirection) {
@@ -242,6 +250,7 @@ TEST_F(GpioBackendTest, ADroppedPortTakesEveryCall) {
   EXPECT_TRUE(io_port_set_direction(port(), false));
   EXPECT_FALSE(io_port_set_state(port(), true));
   EXPECT_TRUE(io_port_set_activelow(port(), true, false));
+  EXPECT_TRUE(log.took_warning("Set state on incorrect port"));
 }
 
 TEST_F(GpioBackendTest, ADroppedPortCanBeSetUpAgain) {
@@ -254,7 +263,7 @@ TEST_F(GpioBackendTest, ADroppedPortCanBeSetUpAgain) {
   io_port_set_watch(port());
   line("alarm").edge(1);
   serve();
-  EXPECT_EQ(reported, States{true});
+  EXPECT_EQ(reported(), States{true});
 }
 
 // --- Threads ---

@@ -1,17 +1,13 @@
 // A port on the GPIO backend, whose lines are the tests'.
 #pragma once
 
-#include <string>
-#include <utility>
 #include <vector>
 
+#include "backend-fixture.h"
 #include "fake-ugpio.h"
-#include "port-fixture.h"
 #include "seams.h"
 
-using States = std::vector<bool>;
-
-class GpioBackendTest : public PortTest {
+class GpioBackendTest : public BackendTest {
  protected:
   GpioBackendTest() {
     fake_ugpio().reset();
@@ -35,5 +31,4 @@ class GpioBackendTest : public PortTest {
     return input;
   }
   static FakeLine &line(const char *name) { return fake_ugpio().line(name); }
-  static States take_reported() { return std::exchange(reported, {}); }
 };

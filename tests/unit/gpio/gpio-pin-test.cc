@@ -4,7 +4,7 @@
 
 #include "backends/libugpio-utils.h"
 #include "fake-ugpio.h"
-#include "log-capture.h"
+#include "support/log-capture.h"
 
 namespace {
 
@@ -44,7 +44,7 @@ TEST_F(GpioPinTest, TheFailureMessageHasNumberAndAlias) {
   set("alias", "siren");
   fake_ugpio().line("siren").request_error = EBUSY;
   EXPECT_FALSE(libugpio_request_gpio_pin(pin.get(), true, false));
-  EXPECT_EQ(log.warnings(), Calls{"Failed to allocate pin 12/siren"});
+  EXPECT_EQ(log.take_warnings(), Calls{"Failed to allocate pin 12/siren"});
   EXPECT_EQ(pin->handle, nullptr);
 }
 
@@ -52,7 +52,7 @@ TEST_F(GpioPinTest, TheFailureMessageOfAPinWithoutAliasNamesNone) {
   set("pin", "12");
   fake_ugpio().line("12").request_error = EBUSY;
   EXPECT_FALSE(libugpio_request_gpio_pin(pin.get(), true, false));
-  EXPECT_EQ(log.warnings(), Calls{"Failed to allocate pin 12/(null)"});
+  EXPECT_EQ(log.take_warnings(), Calls{"Failed to allocate pin 12/(null)"});
 }
 
 TEST_F(GpioPinTest, ARepeatedAliasReplacesTheEarlierOne) {
@@ -87,7 +87,7 @@ TEST_F(GpioPinTest, NumbersAreDecimal) {
 TEST_F(GpioPinTest, OtherKeysAreIgnored) {
   set("pins", "12");
   EXPECT_EQ(pin->pin, 0);
-  EXPECT_TRUE(log.warnings().empty());
+  EXPECT_TRUE(log.empty());
 }
 
 struct InitialLevel {
@@ -122,14 +122,14 @@ TEST_F(GpioPinTest, AnInvertedPinIsActiveLow) {
 TEST_F(GpioPinTest, ALineThatDoesNotOpenFailsTheRequest) {
   fake_ugpio().line("0").open_error = EACCES;
   EXPECT_FALSE(libugpio_request_gpio_pin(pin.get(), true, false));
-  EXPECT_EQ(log.warnings(), Calls{"Failed to open pin fd!"});
+  EXPECT_EQ(log.take_warnings(), Calls{"Failed to open pin fd!"});
   EXPECT_EQ(fake_ugpio().calls, Calls{"request_one pin 0 0x14D"});
 }
 
 TEST_F(GpioPinTest, ALineWhoseSenseCannotBeSetFailsTheRequest) {
   fake_ugpio().line("0").activelow_error = EPERM;
   EXPECT_FALSE(libugpio_request_gpio_pin(pin.get(), true, false));
-  EXPECT_EQ(log.warnings(), Calls{"Failed set active low!"});
+  EXPECT_EQ(log.take_warnings(), Calls{"Failed set active low!"});
 }
 
 TEST_F(GpioPinTest, ASecondRequestGivesTheFirstLineBack) {
@@ -158,7 +158,7 @@ TEST_F(GpioPinTest, SettingALineSaysNothing) {
   EXPECT_TRUE(libugpio_request_gpio_pin(pin.get(), false, false));
   EXPECT_TRUE(libugpio_set_gpio_pin(pin.get(), 1));
   EXPECT_EQ(fake_ugpio().line("0").value, 1);
-  EXPECT_TRUE(log.warnings().empty());
+  EXPECT_TRUE(log.empty());
 }
 
 TEST_F(GpioPinTest, AFailedSetNamesTheAliasAndTheReason) {
@@ -166,7 +166,7 @@ TEST_F(GpioPinTest, AFailedSetNamesTheAliasAndTheReason) {
   EXPECT_TRUE(libugpio_request_gpio_pin(pin.get(), false, false));
   fake_ugpio().line("door").write_error = EIO;
   EXPECT_FALSE(libugpio_set_gpio_pin(pin.get(), 1));
-  EXPECT_EQ(log.warnings(), Calls{"Failed to set gpio pin door: Input/output error"});
+  EXPECT_EQ(log.take_warnings(), Calls{"Failed to set gpio pin door: Input/output error"});
 }
 
 TEST_F(GpioPinTest, APinWithoutHandleFailsQuietlyInEveryOperation) {
@@ -174,9 +174,9 @@ TEST_F(GpioPinTest, APinWithoutHandleFailsQuietlyInEveryOperation) {
   EXPECT_EQ(errno, EINVAL);
   EXPECT_EQ(libugpio_write_gpio_pin(pin.get(), 1), -1);
   EXPECT_EQ(libugpio_gpio_pin_fd(pin.get()), -1);
-  EXPECT_TRUE(log.warnings().empty());
+  EXPECT_TRUE(log.empty());
   EXPECT_FALSE(libugpio_set_gpio_pin(pin.get(), 1));
-  EXPECT_EQ(log.warnings(), Calls{"Failed to set gpio pin (null): Invalid argument"});
+  EXPECT_EQ(log.take_warnings(), Calls{"Failed to set gpio pin (null): Invalid argument"});
 }
 
 TEST_F(GpioPinTest, NoPinReadsAndWritesLikeOneWithoutHandle) {

@@ -6,18 +6,16 @@
 #include <string>
 
 #include "allocations.h"
+#include "backend-fixture.h"
 #include "fake-spidev.h"
-#include "port-fixture.h"
 #include "seams.h"
 
 namespace {
 
-using States = std::vector<bool>;
-
 // Any file that can be opened: what is sent to its descriptor goes to the fake.
 constexpr const char *kDevice = "/dev/null";
 
-class SpiAdcBackendTest : public PortTest {
+class SpiAdcBackendTest : public BackendTest {
  protected:
   SpiAdcBackendTest() {
     fake_spidev() = {};
@@ -157,7 +155,7 @@ TEST_F(SpiAdcBackendTest, WithoutRangesTheInputIsInactive) {
 TEST_F(SpiAdcBackendTest, InputPropertiesBeforeAnyRangeAreLoggedAndLost) {
   run(join({{"input", "active_min", "0"}, {"input", "active_max", "4095"}},
            range("10", "20", "0")));
-  EXPECT_EQ(log.count("Spi ADC backend configured incorrectly"), 2);
+  EXPECT_EQ(log.take_all(G_LOG_LEVEL_WARNING, "Spi ADC backend configured incorrectly"), 2U);
   EXPECT_FALSE(after(1000));
   EXPECT_TRUE(after(15));
 }
@@ -170,12 +168,12 @@ TEST_F(SpiAdcBackendTest, ARangeElementBeginsOneRangePerAttribute) {
 
 TEST_F(SpiAdcBackendTest, AnUnknownSectionIsLogged) {
   make({{"spi", "device", "/dev/spidev0.0"}});
-  EXPECT_EQ(log.count("Could not parse backend data!\n"), 1);
+  EXPECT_TRUE(log.took_warning("Could not parse backend data!\n"));
 }
 
 TEST_F(SpiAdcBackendTest, UnknownKeysAreIgnored) {
   make({{"device", "speed", "1"}, {"range", "any", "1"}, {"input", "minimum", "1"}});
-  EXPECT_TRUE(log.warnings().empty());
+  EXPECT_TRUE(log.empty());
 }
 
 TEST_F(SpiAdcBackendTest, AnInvertedInputIsActiveOutsideAllRanges) {
@@ -201,7 +199,7 @@ TEST_F(SpiAdcBackendTest, AFailedTransferIsASampleOfZero) {
   run(range("0", "10", "0"));
   fake_spidev().error = EIO;
   EXPECT_TRUE(after(3000));
-  EXPECT_EQ(log.count("SPI_IOC_MESSAGE failed! : Input/output error"), 1);
+  EXPECT_TRUE(log.took_warning("SPI_IOC_MESSAGE failed! : Input/output error"));
 }
 
 TEST_F(SpiAdcBackendTest, AFailedTransferIsASampleOfZeroWhateverItReceived) {
@@ -209,6 +207,7 @@ TEST_F(SpiAdcBackendTest, AFailedTransferIsASampleOfZeroWhateverItReceived) {
   fake_spidev().error = EIO;
   fake_spidev().scribbles = true;
   EXPECT_FALSE(after(1500));
+  EXPECT_TRUE(log.took_warning("SPI_IOC_MESSAGE failed! : Input/output error"));
 }
 
 TEST_F(SpiAdcBackendTest, SamplingGoesOnAfterAFailure) {
@@ -217,6 +216,7 @@ TEST_F(SpiAdcBackendTest, SamplingGoesOnAfterAFailure) {
   EXPECT_FALSE(after(1500));
   fake_spidev().error = 0;
   EXPECT_TRUE(after(1500));
+  EXPECT_TRUE(log.took_warning("SPI_IOC_MESSAGE failed! : Input/output error"));
 }
 
 TEST_F(SpiAdcBackendTest, OnlyChangesAreReported) {
@@ -224,14 +224,14 @@ TEST_F(SpiAdcBackendTest, OnlyChangesAreReported) {
   for (const int sample : {0, 1500, 1600, 0, 0}) {
     (void)after(sample);
   }
-  EXPECT_EQ(reported, (States{true, false}));
+  EXPECT_EQ(reported(), (States{true, false}));
 }
 
 TEST_F(SpiAdcBackendTest, AnActiveLowInputReportsTheInvertedState) {
   run_usual_range();
   io_port_restore_activelow(port(), true, true);
   (void)after(1500);
-  EXPECT_EQ(reported, States{false});
+  EXPECT_EQ(reported(), States{false});
 }
 
 TEST_F(SpiAdcBackendTest, NoLimitOverflows) {
@@ -247,11 +247,12 @@ TEST_F(SpiAdcBackendTest, ARepeatedDeviceReplacesTheEarlierOne) {
 
 TEST_F(SpiAdcBackendTest, ADeviceThatDoesNotOpenFailsTheSetUp) {
   EXPECT_FALSE(io_port_setup(make({{"device", "device", "/nonexistent"}})));
-  EXPECT_EQ(log.count("Failed to open /nonexistent: No such file or directory"), 1);
+  EXPECT_TRUE(log.took_warning("Failed to open /nonexistent: No such file or directory"));
 }
 
 TEST_F(SpiAdcBackendTest, AMissingDeviceFailsTheSetUp) {
   EXPECT_FALSE(io_port_setup(make({})));
+  EXPECT_TRUE(log.took_warning("Failed to open : No such file or directory"));
 }
 
 TEST_F(SpiAdcBackendTest, ADeviceThatDidNotOpenIsSampledAsZero) {
@@ -261,8 +262,9 @@ TEST_F(SpiAdcBackendTest, ADeviceThatDidNotOpenIsSampledAsZero) {
   io_port_set_watch(port());
   EXPECT_TRUE(sample_once());
   EXPECT_EQ(fake_spidev().messages.front().fd, -1);
-  EXPECT_EQ(log.count("SPI_IOC_MESSAGE failed! : Bad file descriptor"), 1);
+  EXPECT_TRUE(log.took_warning("SPI_IOC_MESSAGE failed! : Bad file descriptor"));
   EXPECT_FALSE(io_port_get_state(port())) << "it is not set up";
+  EXPECT_TRUE(log.took_warning("Failed to open /nonexistent: No such file or directory"));
 }
 
 TEST_F(SpiAdcBackendTest, AnOutputCannotBeSetUp) {
@@ -270,6 +272,8 @@ TEST_F(SpiAdcBackendTest, AnOutputCannotBeSetUp) {
   EXPECT_FALSE(io_port_setup(port()));
   make_port("spiadc", PORT_CONFIGURABLE, device());
   EXPECT_FALSE(io_port_setup(port()));
+  EXPECT_EQ(
+      log.take_all(G_LOG_LEVEL_WARNING, "Port terminal: an SPI ADC port can only be an input"), 2U);
 }
 
 TEST_F(SpiAdcBackendTest, ARepeatedAnnouncementReplacesTheTimer) {

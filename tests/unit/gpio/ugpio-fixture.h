@@ -13,8 +13,8 @@
 
 #include "base/glib-ptr.h"
 #include "kernel-tree.h"
-#include "log-capture.h"
 #include "platform/host/ugpio-host.h"
+#include "support/log-capture.h"
 
 using Writes = std::vector<std::string>;
 using ContextPtr = std::unique_ptr<ugpio_t, GlibDeleter<ugpio_free>>;
@@ -48,6 +48,12 @@ class UgpioHostTest : public testing::Test {
   }
   void set_line_file(const char *name, const char *text) const {
     tree.write_file(std::string("class/gpio/gpio12/") + name, text);
+  }
+
+  // Whether there was a warning of that beginning about that file of the kernel.
+  bool warned(const std::string &beginning, const std::string &file, int code) {
+    return log.took_warning(beginning + " " + ugpio_host_root() + "/class/gpio/" + file + ": " +
+                            g_strerror(code));
   }
 
   LogCapture log;

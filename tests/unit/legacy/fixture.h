@@ -4,11 +4,11 @@
 #include <gtest/gtest.h>
 
 #include <string>
-#include <vector>
 
 #include "backends/check-backend.h"
 #include "port/ioport.h"
 #include "support/log-capture.h"
+#include "support/temp-dir.h"
 
 // Ports on the check backend, in an otherwise empty registry.
 class LegacyTest : public testing::Test {
@@ -21,16 +21,17 @@ class LegacyTest : public testing::Test {
   ~LegacyTest() override;
 
   // The registry keeps the port for as long as the test runs.
-  static IOPort *add_port(int number, PortType type, const char *flag = "ioport");
+  static IOPort *add_port(int number, PortType type);
   // Writes a file that goes with the test, and gives its path.
-  std::string write_file(const char *name, const std::string &contents);
-  std::string path_of(const char *name) const;
+  std::string write_file(const char *name, const std::string &contents) const {
+    return directory_.write(name, contents);
+  }
+  std::string path_of(const char *name) const { return directory_.path(name); }
   LogCapture &log() { return log_; }
 
  private:
   LogCapture log_;
-  std::string directory_;
-  std::vector<std::string> files_;
+  TempDir directory_;
 };
 
 std::string read_file(const std::string &path);

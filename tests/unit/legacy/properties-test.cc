@@ -5,6 +5,7 @@
 #include "dbus/legacy-properties.h"
 #include "fixture.h"
 #include "port/port-error.h"
+#include "support/port-builder.h"
 
 namespace {
 
@@ -97,7 +98,7 @@ TEST_F(PropertiesTest, texts_are_utf8_whatever_a_port_holds) {
 }
 
 TEST_F(PropertiesTest, ports_that_are_not_the_devices_own_lack_a_direction) {
-  add_port(0, PORT_OUTPUT, "virtual");
+  PortBuilder().number(0).output().flag("ioport", "false").flag("virtual").registered();
   EXPECT_EQ(get(0, kLegacyService, "Direction"), "The port has no value for 'Direction'");
   EXPECT_EQ(get(0, kLegacyService, "Configurable"), "The port has no value for 'Configurable'");
   EXPECT_EQ(get(0, kLegacyService, "NbrOfIOPorts"), "0");

@@ -1,12 +1,9 @@
-#include <sys/resource.h>
-
-#include <csignal>
-
 #include "base/glib-ptr.h"
 #include "base/log.h"
 #include "fixture.h"
 #include "port/port-error.h"
 #include "settings/param-legacy.h"
+#include "support/file-size-limit.h"
 
 namespace {
 
@@ -50,31 +47,11 @@ TEST_F(UpgradeTest, files_that_are_no_key_files) {
   EXPECT_EQ(upgrade(good, bad), "Unable to open output file: " + good);
 }
 
-// As on a full disk, and for any user.
-class NoRoomForFiles {
- public:
-  NoRoomForFiles() : previous_handler_(std::signal(SIGXFSZ, SIG_IGN)) {
-    getrlimit(RLIMIT_FSIZE, &previous_);
-    const rlimit none = {0, previous_.rlim_max};
-    setrlimit(RLIMIT_FSIZE, &none);
-  }
-  ~NoRoomForFiles() {
-    setrlimit(RLIMIT_FSIZE, &previous_);
-    (void)std::signal(SIGXFSZ, previous_handler_);
-  }
-  NoRoomForFiles(const NoRoomForFiles &) = delete;
-  NoRoomForFiles &operator=(const NoRoomForFiles &) = delete;
-
- private:
-  rlimit previous_{};
-  void (*previous_handler_)(int);
-};
-
 TEST_F(UpgradeTest, result_that_cannot_be_stored) {
   const std::string input = write_file("in", "[a]\nx=new\n");
   const std::string output = write_file("out", "[a]\nx=old\n");
   {
-    const NoRoomForFiles no_room;
+    const FileSizeLimit no_room(0);
     EXPECT_FALSE(param_upgrade(input.c_str(), output.c_str(), nullptr));
   }
   EXPECT_EQ(read_file(output), "[a]\nx=old\n");

@@ -1,5 +1,4 @@
 // The converter that is sampled into a buffer.
-#include <fcntl.h>
 #include <unistd.h>
 
 #include <atomic>
@@ -23,18 +22,7 @@ const std::string kTimer = "sys/kernel/config/iio/triggers/hrtimer/pulse";
 // A converter whose low level is closed (100 to 200) and whose high level is cut (3000 to 4000).
 class Iio : public IioBench {
  protected:
-  Iio() {
-    make_device(0, "other");
-    make_device(2, "buffer");
-    make_device(5, "adc");
-    write(kTrigger + "name", "pulse\n");
-    write(kTrigger + "sampling_frequency", "");
-    write(attribute(5, "trigger/current_trigger"), "\n");
-    write(attribute(2, "scan_elements/in_voltage3_en"), "");
-    write(attribute(2, "buffer/enable"), "");
-    set_type("le:u12/16>>0");
-    make_node(2);
-  }
+  Iio() { make_buffered_converter(); }
 
   void set_type(const char *type) const {
     write(attribute(2, "scan_elements/in_voltage3_type"), std::string(type) + "\n");

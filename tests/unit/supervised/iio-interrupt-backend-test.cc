@@ -1,7 +1,5 @@
 // The converter that watches thresholds by itself.
-#include <fcntl.h>
 #include <linux/iio/events.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <atomic>
@@ -30,16 +28,8 @@ class Interrupt : public IioBench {
   }
 
   void make_converter(int device, const char *name) {
-    make_device(device, name);
-    for (const char *channel : {"in_voltage0", "in_voltage1"}) {
-      write(attribute(device, std::string(channel) + "_raw"), "150\n");
-      for (const char *file : {"rising_value", "falling_value", "rising_en", "falling_en"}) {
-        write(attribute(device, std::string("events/") + channel + "_thresh_" + file), "");
-      }
-    }
-    make_node(device);
-    EXPECT_EQ(mkfifo((node(device) + ".events").c_str(), 0600), 0);
-    writer.reset(open((node(device) + ".events").c_str(), O_RDWR | O_NONBLOCK | O_CLOEXEC));
+    make_threshold_converter(device, name);
+    writer.reset(open_events(device));
   }
 
   std::string node(int device) const { return path("dev/iio:device" + std::to_string(device)); }
@@ -266,7 +256,7 @@ TEST_F(Interrupt, PortsOfTheSameChannelOnTwoDevicesAreBothArmedAgain) {
   make_converter(7, "second");
   const UniqueFd second_writer = std::move(writer);
   const IOPortRef other = watched({{"device", "driver", "second"}});
-  writer.reset(open((node(6) + ".events").c_str(), O_RDWR | O_NONBLOCK | O_CLOEXEC));
+  writer.reset(open_events(6));
   const IOPortRef port = watched();
   io_port_set_number(port.get(), 2);
   set_raw(250);

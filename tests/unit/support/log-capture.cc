@@ -72,6 +72,18 @@ std::size_t LogCapture::take_all(int level, std::string_view text) {
                        [&](const auto &m) { return m.level == level && m.text == text; });
 }
 
+std::vector<std::string> LogCapture::take_warnings() {
+  const std::lock_guard lock(lock_);
+  std::vector<std::string> warnings;
+  std::erase_if(messages_, [&](const auto &m) {
+    if (m.level == G_LOG_LEVEL_WARNING) {
+      warnings.push_back(m.text);
+    }
+    return m.level == G_LOG_LEVEL_WARNING;
+  });
+  return warnings;
+}
+
 bool LogCapture::empty() {
   const std::lock_guard lock(lock_);
   return messages_.empty();

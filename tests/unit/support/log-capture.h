@@ -31,6 +31,8 @@ class LogCapture {
   [[nodiscard]] bool took_containing(int level, std::string_view part);
   // Takes every message of that level and text and gives their number.
   [[nodiscard]] std::size_t take_all(int level, std::string_view text);
+  // Takes the texts of all warnings, oldest first.
+  [[nodiscard]] std::vector<std::string> take_warnings();
   // Whether nothing was logged that nobody took.
   [[nodiscard]] bool empty();
   // Takes everything, for tests that are not about what is logged.

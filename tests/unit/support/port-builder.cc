@@ -13,6 +13,12 @@ PortBuilder::PortBuilder() : port_(io_port_new()) {
   io_port_set_flag(port_.get(), "ioport", "true");
 }
 
+PortBuilder &PortBuilder::type(PortType type) {
+  io_port_set_type(port_.get(), type);
+  io_port_restore_direction(port_.get(), io_port_direction_input(port_.get()));
+  return *this;
+}
+
 PortBuilder &PortBuilder::input() {
   io_port_set_type(port_.get(), PORT_INPUT);
   return *this;

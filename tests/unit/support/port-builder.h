@@ -17,6 +17,8 @@ class PortBuilder {
  public:
   PortBuilder();
 
+  // In the role that ports of that type start with.
+  PortBuilder &type(PortType type);
   PortBuilder &input();
   PortBuilder &output();
   // Configurable, in the role given.

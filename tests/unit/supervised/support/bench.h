@@ -5,6 +5,7 @@
 #include <glib.h>
 #include <gtest/gtest.h>
 
+#include <cstddef>
 #include <cstdint>
 #include <string>
 #include <string_view>
@@ -63,12 +64,16 @@ class Bench : public testing::Test {
   static bool was_logged(std::string_view line);
 
   // --- The main loop ---
-  // Runs what is ready.
+  // Runs what is ready. A loop that always has something to do fails the test.
   static void iterate();
+  // How many sources of any kind there are: timers, watches of descriptors, idle ones.
+  static std::size_t sources();
   // The intervals of the armed timers, oldest first.
   static std::vector<guint> timers();
   // Lets every armed timer of that interval expire once.
   static void expire(guint interval);
+  // The same for every interval that a timer is armed with.
+  static void expire_all();
 
   std::string root_;
 };
