@@ -205,8 +205,12 @@ TEST_F(UgpioHostTest, TheRightsToTheEdgesAreWaitedForEvenWhenTheDirectionCouldBe
       set_line_modes(0666);
     }
   };
-  const Unprivileged nobody;
-  EXPECT_TRUE(request(kInput));
+  ContextPtr context;
+  {
+    const Unprivileged nobody;
+    context = request(kInput);
+  }
+  EXPECT_TRUE(context);
   EXPECT_EQ(tree.slept, 20'000);
 }
 
