@@ -138,8 +138,8 @@ TEST_P(Supervisable, ReadsOutOrSaysWhyNotAtEveryStage) {
     SupervisedRangeState state = SUPERVISED_STATE_OPEN;
     std::uint32_t level = 0;
     Error error;
-    EXPECT_NE(io_port_get_supervised_readout(port.get(), &state, &level, error.out()),
-              static_cast<bool>(error));
+    const bool read = io_port_get_supervised_readout(port.get(), &state, &level, error.out());
+    EXPECT_NE(read, static_cast<bool>(error));
     (void)io_port_get_supervised_readout(port.get(), &state, &level, nullptr);
   }
 }

@@ -11,7 +11,6 @@
 
 namespace {
 
-constexpr int kVirtualKind = 0;
 constexpr int kCheckKind = 9;
 constexpr PortType kTypes[] = {PORT_INPUT, PORT_OUTPUT, PORT_CONFIGURABLE};
 
@@ -262,7 +261,7 @@ TEST_P(Backend, FreesADroppedPortOnce) {
 
 TEST_P(Backend, MakesWayForAnotherAndTakesThePortBack) {
   const auto port = watched();
-  io_port_set_backend(port.get(), GetParam().kind == kCheckKind ? kVirtualKind : kCheckKind);
+  io_port_set_backend(port.get(), GetParam().kind == kCheckKind ? kVirtualBackend : kCheckKind);
   expect_given_back();
   EXPECT_TRUE(io_port_setup(port.get()));
   io_port_set_backend(port.get(), GetParam().kind);
