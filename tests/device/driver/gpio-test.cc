@@ -28,6 +28,10 @@ class Gpio : public DeviceTest {
                         numbered("input", kTerminalIn) + numbered("output", kTerminalOut) +
                             numbered("io_ctrl", kTerminalCtrl));
   }
+  Entries terminal_history() const {
+    return LineHistory::together(
+        {{sim_.number(kTerminalOut), "output"}, {sim_.number(kTerminalCtrl), "control"}});
+  }
 
   GpioSim sim_{"lines", {"", "", "", "", "term-in", "term-out", "term-ctrl"}};
 };
@@ -122,8 +126,15 @@ TEST_F(Gpio, ATerminalThatBecomesAnInputIsLetGoOfFirst) {
   EXPECT_EQ(client_.set_state(4, true), "");
   const LineHistory history;
   EXPECT_EQ(client_.set_direction(4, "input"), "");
-  EXPECT_EQ(LineHistory::of(sim_.number(kTerminalOut)), Entries{"set 0"});
-  EXPECT_EQ(LineHistory::of(sim_.number(kTerminalCtrl)), Entries{"set 0"});
+  EXPECT_EQ(terminal_history(), (Entries{"output set 0", "control set 0"}));
+}
+
+TEST_F(Gpio, ATerminalThatBecomesAnOutputIsSwitchedBeforeItIsDriven) {
+  start(all_ports());
+  const LineHistory history;
+  EXPECT_EQ(client_.set_direction(4, "output"), "");
+  EXPECT_EQ(client_.set_state(4, true), "");
+  EXPECT_EQ(terminal_history(), (Entries{"control set 1", "output set 0", "output set 1"}));
 }
 
 TEST_F(Gpio, ADirectionSurvivesARestart) {

@@ -1,18 +1,17 @@
 // The daemon opens everything as root and then is "pcd": what it can still do, and what happens to
 // what it opens anew.
-#include <grp.h>
 #include <pwd.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
-#include <filesystem>
 #include <memory>
 #include <sstream>
 
 #include "support/mock-iio.h"
 #include "support/mock-spi.h"
+#include "support/rights.h"
 #include "support/supervised-test.h"
 
 namespace {
@@ -20,27 +19,6 @@ namespace {
 constexpr int kSampled = 2;  // channels of the converter
 constexpr int kWatched = 5;
 constexpr unsigned int kCommand = 0x11;
-constexpr mode_t kGroupMayWrite = 0664;
-
-// What a rule of the device manager does: the service's group may read and write.
-void grant(const std::string &path) {
-  const group *hardware = getgrnam("hardware");
-  ASSERT_TRUE(hardware);
-  EXPECT_EQ(chown(path.c_str(), 0, hardware->gr_gid), 0) << path;
-  EXPECT_EQ(chmod(path.c_str(), kGroupMayWrite), 0) << path;
-}
-
-// All attributes below a folder of sysfs.
-void grant_tree(const std::string &folder) {
-  for (const auto &entry :
-       std::filesystem::recursive_directory_iterator(std::filesystem::canonical(folder))) {
-    if (entry.is_regular_file() &&
-        (entry.status().permissions() & std::filesystem::perms::owner_write) !=
-            std::filesystem::perms::none) {
-      grant(entry.path());
-    }
-  }
-}
 
 // One message that holds both.
 bool logged_together(const std::string &one, const std::string &other) {
@@ -56,14 +34,16 @@ bool logged_together(const std::string &one, const std::string &other) {
 class Privileges : public SupervisedTest {
  protected:
   enum Number { kIn, kOut, kAdc, kSpi, kIio, kInterrupt };
+  // Lines of the plain chip.
+  enum PlainLine { kInLine, kOutLine, kIioLine, kIioIoCtrl, kIioSioCtrl, kInterruptLine };
 
   void SetUp() override { MockIio::set_value(kSampled, kOpen); }
 
   std::string all_backends() const {
-    return port_element("in", kIn, "input", "gpio", "<input pin='" + plain_.number_text(0) + "'/>",
-                        true) +
+    return port_element("in", kIn, "input", "gpio",
+                        "<input pin='" + plain_.number_text(kInLine) + "'/>", true) +
            port_element("out", kOut, "output", "gpio",
-                        "<output pin='" + plain_.number_text(1) + "'/>") +
+                        "<output pin='" + plain_.number_text(kOutLine) + "'/>") +
            port_element("adc", kAdc, "input", "spiadc",
                         "<device device='" + MockSpi::node(0) +
                             "' address='17' timeout='50'/><range n='1'/><input active_min='1000' "
@@ -74,26 +54,58 @@ class Privileges : public SupervisedTest {
                             "'/><address value='11'/>" + all_ranges(),
                         true) +
            port_element("iio", kIio, "input", "iio",
-                        "<input pin='" + plain_.number_text(2) + "'/><io_ctrl pin='" +
-                            plain_.number_text(3) + "'/><sio_ctrl pin='" + plain_.number_text(4) +
+                        "<input pin='" + plain_.number_text(kIioLine) + "'/><io_ctrl pin='" +
+                            plain_.number_text(kIioIoCtrl) + "'/><sio_ctrl pin='" +
+                            plain_.number_text(kIioSioCtrl) +
                             "'/><device name='mock-adc0' adc='mock-adc0' hrtimer='" +
                             TimerTrigger::kName + "' freq='100' channel='" +
                             std::to_string(kSampled) + "'/>" + all_ranges(),
                         true) +
            port_element("interrupt", kInterrupt, "input", "iio-interrupt",
-                        "<input pin='" + plain_.number_text(5) +
+                        "<input pin='" + plain_.number_text(kInterruptLine) +
                             "'/><device driver='mock-adc1' channel='" + std::to_string(kWatched) +
                             "' hysteresis='5' cache_ad_value='false'/>" + all_ranges(),
                         true);
   }
 
   void start_all() {
-    plain_.export_low(4);
+    plain_.export_low(kIioSioCtrl);
     start(all_backends());
   }
   bool in_service(const std::string &name) {
     const auto names = client_.ports();
     return std::find(names.begin(), names.end(), name) != names.end();
+  }
+  void drop_all() {
+    for (const char *name : {"in", "adc", "spi", "iio", "interrupt"}) {
+      EXPECT_EQ(client_.drop(name), std::vector<std::string>{name});
+    }
+    client_.forget_changes();
+  }
+  static void grant_lines(const GpioSim &sim, const std::vector<int> &lines) {
+    for (const int line : lines) {
+      grant_tree("/sys/class/gpio/gpio" + sim.number_text(line));
+    }
+  }
+  // All ports but the output, the buffered one at what its converter was set to.
+  void expect_inputs_work(unsigned int level, const std::string &state) {
+    for (const char *name : {"in", "adc", "spi", "iio", "interrupt"}) {
+      EXPECT_TRUE(in_service(name)) << name;
+    }
+    plain_.pull(kInLine, true);
+    EXPECT_TRUE(reports(kIn, true));
+    MockSpi::set_sample(0, kCommand, 1500);
+    EXPECT_TRUE(reports(kAdc, true));
+    MockSpi::set_sample(1, kCommand, kOpen);
+    for (const int port : {kSpi, kIio, kInterrupt}) {
+      EXPECT_EQ(client_.set_supervised(port, true), "");
+    }
+    expect_path(true);
+    EXPECT_TRUE(plain_.level(kIioSioCtrl));
+    EXPECT_TRUE(reads(kSpi, "open", kOpen));
+    EXPECT_TRUE(reads(kIio, state, level));
+    MockIio::set_value(kWatched, kCut, 1);
+    EXPECT_TRUE(reads(kInterrupt, "cut", kCut));
   }
   std::string status_line(const std::string &field) const {
     std::istringstream status(
@@ -123,21 +135,9 @@ TEST_F(Privileges, TheDaemonIsTheServiceAccountWithItsGroups) {
 
 TEST_F(Privileges, EveryBackendWorksOnAfterTheDrop) {
   start_all();
-  plain_.pull(0, true);
-  EXPECT_TRUE(reports(kIn, true));
   EXPECT_EQ(client_.set_state(kOut, true), "");
-  EXPECT_TRUE(plain_.level(1));
-  MockSpi::set_sample(0, kCommand, 1500);
-  EXPECT_TRUE(reports(kAdc, true));
-  MockSpi::set_sample(1, kCommand, kOpen);
-  for (const int port : {kSpi, kIio, kInterrupt}) {
-    EXPECT_EQ(client_.set_supervised(port, true), "");
-  }
-  expect_path(true);
-  EXPECT_TRUE(reads(kSpi, "open", kOpen));
-  EXPECT_TRUE(reads(kIio, "open", kOpen));
-  MockIio::set_value(kWatched, kCut, 1);
-  EXPECT_TRUE(reads(kInterrupt, "cut", kCut));
+  EXPECT_TRUE(plain_.level(kOutLine));
+  expect_inputs_work(kOpen, "open");
 }
 
 TEST_F(Privileges, SettingsAreSavedAndStayTheAccounts) {
@@ -155,45 +155,55 @@ TEST_F(Privileges, SettingsAreSavedAndStayTheAccounts) {
 // Nobody has given the account any rights: each port that comes back says what it may not do.
 TEST_F(Privileges, ARefreshWithoutRightsSaysWhatIsMissing) {
   start_all();
-  for (const char *name : {"in", "adc", "spi", "iio", "interrupt"}) {
-    EXPECT_EQ(client_.drop(name), std::vector<std::string>{name});
-  }
+  drop_all();
   EXPECT_EQ(client_.refresh(), "");
   const std::string denied = g_strerror(EACCES);
   const std::string lines = "/sys/class/gpio/";
   for (const std::string &what :
-       {lines + "unexport", lines + "gpio" + plain_.number_text(0) + "/direction",
-        lines + "gpio" + sim_.number_text(kSioCtrl) + "/active_low", MockSpi::node(0),
+       {lines + "unexport", lines + "gpio" + plain_.number_text(kInLine) + "/direction",
+        lines + "gpio" + sim_.number_text(kSioCtrl) + "/active_low",
+        lines + "gpio" + plain_.number_text(kIioSioCtrl) + "/active_low", MockSpi::node(0),
         MockIio::node(1)}) {
     EXPECT_TRUE(logged_together(what, denied)) << what;
   }
-  EXPECT_FALSE(in_service("adc"));
-  EXPECT_FALSE(in_service("spi"));
-  EXPECT_FALSE(in_service("iio"));
-  EXPECT_FALSE(in_service("interrupt"));
+  for (const char *name : {"adc", "spi", "iio", "interrupt"}) {
+    EXPECT_FALSE(in_service(name)) << name;
+  }
   // What was not dropped works on.
   EXPECT_EQ(client_.set_state(kOut, true), "");
-  EXPECT_TRUE(plain_.level(1));
+  EXPECT_TRUE(plain_.level(kOutLine));
+}
+
+// Its lines alone are not enough for a buffered converter.
+TEST_F(Privileges, ARefreshOfABufferedConverterSaysWhatIsMissing) {
+  start_all();
+  EXPECT_EQ(client_.drop("iio"), std::vector<std::string>{"iio"});
+  grant_lines(plain_, {kIioLine, kIioIoCtrl, kIioSioCtrl});
+  EXPECT_EQ(client_.refresh(), "");
+  const std::string denied = g_strerror(EACCES);
+  for (const std::string &what :
+       {TimerTrigger::folder() + "sampling_frequency", MockIio::folder() + "buffer/enable",
+        std::string("Failed to open device: ")}) {
+    EXPECT_TRUE(logged_together(what, denied)) << what;
+  }
+  EXPECT_FALSE(in_service("iio"));
 }
 
 TEST_F(Privileges, WithRightsFromTheDeviceManagerARefreshWorks) {
   start_all();
-  for (const char *name : {"adc", "interrupt"}) {
-    EXPECT_EQ(client_.drop(name), std::vector<std::string>{name});
+  drop_all();
+  // The account could not give the lines back, so they are there to be used again.
+  grant_lines(plain_, {kInLine, kIioLine, kIioIoCtrl, kIioSioCtrl, kInterruptLine});
+  grant_lines(sim_, {kInput, kIoCtrl, kSioCtrl});
+  grant_tree(TimerTrigger::folder());
+  for (const int device : {0, 1}) {
+    grant(MockSpi::node(device));
+    grant(MockIio::node(device));
+    grant_tree(MockIio::folder(device));
   }
-  grant(MockSpi::node(0));
-  grant(MockIio::node(1));
-  grant_tree(MockIio::folder(1));
-  // The account could not give the line back, so it is there to be used again.
-  grant_tree("/sys/class/gpio/gpio" + plain_.number_text(5));
+  MockIio::set_value(kSampled, kClosed);
   EXPECT_EQ(client_.refresh(), "");
-  EXPECT_TRUE(in_service("adc"));
-  EXPECT_TRUE(in_service("interrupt"));
-  MockSpi::set_sample(0, kCommand, 1500);
-  EXPECT_TRUE(reports(kAdc, true));
-  EXPECT_EQ(client_.set_supervised(kInterrupt, true), "");
-  MockIio::set_value(kWatched, kClosed, 1);
-  EXPECT_TRUE(reads(kInterrupt, "closed", kClosed));
+  expect_inputs_work(kClosed, "closed");
 }
 
 }  // namespace

@@ -1,5 +1,6 @@
 // Supervised inputs on an SPI converter that is polled.
 #include <cerrno>
+#include <map>
 
 #include "support/mock-spi.h"
 #include "support/supervised-test.h"
@@ -76,13 +77,19 @@ TEST_F(SupervisedSpi, SupervisionSwitchesThePaths) {
   EXPECT_TRUE(reports(0, true));
 }
 
-// The paths must never be on together: two supplies would meet on the line.
-TEST_F(SupervisedSpi, SwitchingNeverJoinsThePaths) {
+// Whichever way: for a moment neither path is on, and on the way back both are.
+TEST_F(SupervisedSpi, ThePlainPathIsSwitchedBeforeTheMeasuredOne) {
   start_input();
+  const std::map<int, std::string> paths{{sim_.number(kIoCtrl), "plain"},
+                                         {sim_.number(kSioCtrl), "measured"}};
   const LineHistory history;
   EXPECT_EQ(client_.set_supervised(0, true), "");
-  EXPECT_EQ(LineHistory::of(sim_.number(kIoCtrl)), std::vector<std::string>{"set 0"});
-  EXPECT_EQ(LineHistory::of(sim_.number(kSioCtrl)), std::vector<std::string>{"set 1"});
+  EXPECT_EQ(LineHistory::together(paths),
+            (std::vector<std::string>{"plain set 0", "measured set 1"}));
+  LineHistory::forget();
+  EXPECT_EQ(client_.set_supervised(0, false), "");
+  EXPECT_EQ(LineHistory::together(paths),
+            (std::vector<std::string>{"plain set 1", "measured set 0"}));
 }
 
 TEST_F(SupervisedSpi, AConfigurablePortLeavesBothPathsAsAnOutput) {

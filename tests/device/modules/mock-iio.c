@@ -48,6 +48,9 @@ MODULE_PARM_DESC(either, "one enable bit for both directions");
 static bool shared_frequency;
 module_param(shared_frequency, bool, 0444);
 MODULE_PARM_DESC(shared_frequency, "sampling_frequency in place of in_voltage_sampling_frequency");
+static unsigned int scans;
+module_param(scans, uint, 0644);
+MODULE_PARM_DESC(scans, "how many scans the buffers were given; writing sets the number");
 
 struct mock_channel {
 	int value;
@@ -226,7 +229,6 @@ static u32 sample_of(int value)
 	return noise ? sample | ~(mask << shift) : sample;
 }
 
-/* At most one sample at a time is what the tests read, but a scan may hold all eight. */
 static void store_sample(u8 *to, u32 sample)
 {
 	unsigned int bytes = storagebits / 8, i;
@@ -235,6 +237,7 @@ static void store_sample(u8 *to, u32 sample)
 		to[endian[0] == 'b' ? bytes - 1 - i : i] = sample >> (8 * i);
 }
 
+/* At most one sample at a time is what the tests read, but a scan may hold all eight. */
 static irqreturn_t scan(int irq, void *data)
 {
 	struct iio_poll_func *poll = data;
@@ -249,6 +252,7 @@ static irqreturn_t scan(int irq, void *data)
 		store_sample(samples + position, sample_of(mock->channels[number].value));
 		position += storagebits / 8;
 	}
+	scans++;
 	mutex_unlock(&mock->lock);
 	iio_push_to_buffers(adc, samples);
 	iio_trigger_notify_done(adc->trig);

@@ -2,7 +2,10 @@
 
 #include <array>
 #include <cstdio>
+#include <optional>
 #include <sstream>
+#include <string_view>
+#include <utility>
 
 #include "support/files.h"
 
@@ -15,23 +18,39 @@ std::string tracing(const char *file) {
   return std::string(kTracing) + file;
 }
 
+struct Entry {
+  int gpio = -1;
+  std::string what;
+};
+
 // Reading a level is recorded as well, and no change.
-std::string entry_in(const std::string &line, int number) {
+std::optional<Entry> entry_in(const std::string &line) {
   int gpio = -1;
   int value = -1;
   std::array<char, kWord> word{};
   const auto direction = line.find("gpio_direction: ");
   if (direction != std::string::npos &&
       std::sscanf(line.c_str() + direction, "gpio_direction: %d %7s", &gpio, word.data()) == 2) {
-    return gpio == number ? word.data() : "";
+    return Entry{.gpio = gpio, .what = word.data()};
   }
   const auto level = line.find("gpio_value: ");
   if (level != std::string::npos &&
-      std::sscanf(line.c_str() + level, "gpio_value: %d %7s %d", &gpio, word.data(), &value) == 3) {
-    const std::string what = word.data();
-    return gpio == number && what == "set" ? what + " " + std::to_string(value) : "";
+      std::sscanf(line.c_str() + level, "gpio_value: %d %7s %d", &gpio, word.data(), &value) == 3 &&
+      std::string_view(word.data()) == "set") {
+    return Entry{.gpio = gpio, .what = "set " + std::to_string(value)};
   }
-  return "";
+  return std::nullopt;
+}
+
+std::vector<Entry> all_entries() {
+  std::istringstream trace(read_text(tracing("trace")).value_or(""));
+  std::vector<Entry> entries;
+  for (std::string line; std::getline(trace, line);) {
+    if (auto entry = entry_in(line)) {
+      entries.push_back(std::move(*entry));
+    }
+  }
+  return entries;
 }
 
 }  // namespace
@@ -52,11 +71,20 @@ void LineHistory::forget() {
 }
 
 std::vector<std::string> LineHistory::of(int number) {
-  std::istringstream trace(read_text(tracing("trace")).value_or(""));
   std::vector<std::string> entries;
-  for (std::string line; std::getline(trace, line);) {
-    if (std::string entry = entry_in(line, number); !entry.empty()) {
-      entries.push_back(std::move(entry));
+  for (auto &entry : all_entries()) {
+    if (entry.gpio == number) {
+      entries.push_back(std::move(entry.what));
+    }
+  }
+  return entries;
+}
+
+std::vector<std::string> LineHistory::together(const std::map<int, std::string> &names) {
+  std::vector<std::string> entries;
+  for (const auto &entry : all_entries()) {
+    if (const auto name = names.find(entry.gpio); name != names.end()) {
+      entries.push_back(name->second + " " + entry.what);
     }
   }
   return entries;

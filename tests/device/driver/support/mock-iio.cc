@@ -16,6 +16,7 @@ namespace {
 
 constexpr const char *kDevices = "/sys/bus/iio/devices";
 constexpr const char *kPlugged = "/sys/module/mock_iio/parameters/plugged";
+constexpr const char *kScans = "/sys/module/mock_iio/parameters/scans";
 constexpr const char *kTriggers = "/sys/kernel/config/iio/triggers/hrtimer/";
 
 std::string entry_called(const std::string &name) {
@@ -65,6 +66,14 @@ UniqueFd MockIio::take_events(int device) {
   return UniqueFd(ioctl(file.get(), IIO_GET_EVENT_FD_IOCTL, &events) == 0 ? events : -1);
 }
 
+int MockIio::scans() {
+  return static_cast<int>(read_number(kScans));
+}
+
+void MockIio::forget_scans() {
+  write_text(kScans, "0");
+}
+
 void MockIio::unplug() {
   write_text(kPlugged, "0");
 }
@@ -82,7 +91,10 @@ void TimerTrigger::make() {
   make_folder(std::string(kTriggers) + kName);
 }
 
+std::string TimerTrigger::folder() {
+  return std::string(kDevices) + "/" + entry_called(kName) + "/";
+}
+
 std::string TimerTrigger::frequency() {
-  return read_text(std::string(kDevices) + "/" + entry_called(kName) + "/sampling_frequency")
-      .value_or("(none)");
+  return read_text(folder() + "sampling_frequency").value_or("(none)");
 }

@@ -21,6 +21,9 @@ class MockIio {
   static int event_attribute(int channel, const std::string &name, int device = 0);
   // The one descriptor for events, when nobody has it; an invalid one otherwise.
   static UniqueFd take_events(int device = 0);
+  // How many scans the buffers were given since forget_scans().
+  static int scans();
+  static void forget_scans();
   // Takes all converters away, and brings them back.
   static void unplug();
   static void plug();
@@ -40,5 +43,6 @@ class TimerTrigger {
   TimerTrigger &operator=(const TimerTrigger &) = delete;
 
   static void make();
+  static std::string folder();  // in sysfs
   static std::string frequency();
 };
