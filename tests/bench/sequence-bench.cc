@@ -1,5 +1,5 @@
-// How late the steps of an action sequence are. Prints figures and judges nothing: they belong to
-// the machine that they are taken on.
+// How late the steps of an action sequence are, and how long cancelling one takes. Prints figures
+// and judges nothing: they belong to the machine that they are taken on.
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
@@ -17,6 +17,7 @@ namespace {
 constexpr int kCheckBackend = 9;
 constexpr std::int32_t kStepMs = 5;
 constexpr int kDefaultSteps = 400;
+constexpr int kCancels = 10'000;
 
 std::mutex lock;
 MonotonicCondition ended;
@@ -53,6 +54,40 @@ void run(IOPort *ioport, int steps) {
   }
 }
 
+std::vector<double> lateness(IOPort *ioport, int steps) {
+  run(ioport, steps);
+  io_port_wait_for_action_threads();
+  std::vector<double> late;
+  for (std::size_t i = 1; i < step_times.size(); ++i) {
+    late.push_back(static_cast<double>(step_times[i] - step_times[i - 1]) - kStepMs * 1000.0);
+  }
+  return late;
+}
+
+// Each cancel meets its sequence at another moment, from before the first step to well into the
+// wait.
+std::vector<double> cancels(IOPort *ioport) {
+  constexpr std::int32_t long_ms = 100'000;
+  constexpr int delays = 50;
+  std::vector<double> times;
+  for (int i = 0; i < kCancels; ++i) {
+    io_port_run_action_sequence(ioport, {false, {{true, long_ms}, {false, long_ms}}});
+    g_usleep(static_cast<gulong>(i % delays));
+    const gint64 begin = g_get_monotonic_time();
+    io_port_set_activelow(ioport, i % 2 == 0, false);
+    times.push_back(static_cast<double>(g_get_monotonic_time() - begin));
+  }
+  return times;
+}
+
+void print(const char *what, std::vector<double> times) {
+  std::sort(times.begin(), times.end());
+  std::printf("%s, %zu times: min %.0f us, mean %.1f us, 99%% %.0f us, max %.0f us\n", what,
+              times.size(), times.front(),
+              std::accumulate(times.begin(), times.end(), 0.0) / static_cast<double>(times.size()),
+              times[times.size() * 99 / 100], times.back());
+}
+
 }  // namespace
 
 int main(int argc, char **argv) {
@@ -61,17 +96,7 @@ int main(int argc, char **argv) {
   port_listener().port_changed = on_port_changed;
   port_listener().action_sequence_done = on_done;
   const IOPortRef ioport = make_output();
-  run(ioport.get(), steps);
-  io_port_wait_for_action_threads();
-
-  std::vector<double> late;
-  for (std::size_t i = 1; i < step_times.size(); ++i) {
-    late.push_back(static_cast<double>(step_times[i] - step_times[i - 1]) - kStepMs * 1000.0);
-  }
-  std::sort(late.begin(), late.end());
-  std::printf("%zu steps of %d ms: lateness min %.0f us, mean %.1f us, 99%% %.0f us, max %.0f us\n",
-              late.size(), kStepMs, late.front(),
-              std::accumulate(late.begin(), late.end(), 0.0) / static_cast<double>(late.size()),
-              late[late.size() * 99 / 100], late.back());
+  print("lateness of a step of 5 ms", lateness(ioport.get(), steps));
+  print("cancelling a sequence", cancels(ioport.get()));
   return 0;
 }
