@@ -18,6 +18,7 @@ CONTROL = "com.kelv.IOControl.State"
 CONNECTOR = "com.kelv.PCD.Connector"
 SUPERVISED = "com.kelv.IOSupervised.Supervised"
 LEGACY = "com.kelv.Configuration.Legacy.IOControl1.IOPort"
+NAMES = (CONTROL, CONNECTOR, SUPERVISED, LEGACY)
 DISABLED = "--disable_legacy_interface"
 # Where only one user id exists, that is the one which the service account would have.
 ACCOUNT = PCD_ID if is_real_root() else os.geteuid()
@@ -31,13 +32,18 @@ def door(device):
     return device
 
 
-def test_owns_its_names_while_it_runs(door):
-    names = (CONTROL, CONNECTOR, SUPERVISED, LEGACY)
+def start_whole(door) -> None:
+    """Returns when the daemon has its names and knows it: the answer comes after those of the bus."""
     door.start()
-    for name in names:
+    for name in NAMES:
         door.wait_name(name)
+    door.call("GetNbrPorts")
+
+
+def test_owns_its_names_while_it_runs(door):
+    start_whole(door)
     door.stop()
-    wait_for(lambda: not any(door.bus.has_owner(name) for name in names), "release of the names")
+    wait_for(lambda: not any(door.bus.has_owner(name) for name in NAMES), "release of the names")
 
 
 def name_changes(device):
@@ -45,9 +51,7 @@ def name_changes(device):
 
 
 def test_gives_its_names_up_from_the_newest_interface_to_the_oldest(door):
-    door.start()
-    for name in (CONTROL, CONNECTOR, SUPERVISED, LEGACY):
-        door.wait_name(name)
+    start_whole(door)
     with name_changes(door) as changes:
         door.stop()
         changes.wait_count(5)
@@ -56,9 +60,8 @@ def test_gives_its_names_up_from_the_newest_interface_to_the_oldest(door):
 
 
 def test_takes_its_names_as_the_service_account(door):
-    door.start()
-    for name in (CONTROL, CONNECTOR, SUPERVISED, LEGACY):
-        door.wait_name(name)
+    start_whole(door)
+    for name in NAMES:
         assert door.bus.bus_call("GetConnectionUnixUser", "s", name) == ACCOUNT, name
 
 
@@ -244,8 +247,7 @@ def test_unreadable_earlier_settings_are_left_alone(door):
 
 
 def test_the_bus_going_away_is_a_regular_end(door):
-    door.start()
-    door.wait_name(LEGACY)
+    start_whole(door)
     door.bus.kill()
     assert door.wait_exit() == 0
     assert door.log_count("WARNING: portd: Could not release DBus name: ") == 1
