@@ -6,6 +6,8 @@ from typing import Iterator
 
 import pytest
 
+from converters import Converters
+from gpio_tree import GpioTree
 from harness import Device, become_root, default_binary
 
 become_root()
@@ -48,3 +50,19 @@ def make_device(request, tmp_path: Path) -> Iterator:
 @pytest.fixture
 def device(make_device) -> Device:
     return make_device()
+
+
+@pytest.fixture
+def tree(tmp_path: Path) -> Iterator[GpioTree]:
+    """The kernel's files of GPIO lines, for a device that has them for its /sys."""
+    tree = GpioTree(tmp_path)
+    yield tree
+    tree.close()
+
+
+@pytest.fixture
+def converters(device, tree, tmp_path: Path) -> Iterator[Converters]:
+    """Converters beside the lines of `tree`, none of them plugged in yet."""
+    converters = Converters(device, tree, tmp_path)
+    yield converters
+    converters.close()

@@ -1,7 +1,5 @@
 """Ports on GPIO lines, by what the daemon writes to the kernel's files. Edges need a real kernel."""
 
-from typing import Iterator
-
 import pytest
 
 from control import call_everything
@@ -27,13 +25,6 @@ def gpio(kind: str, optional: bool = False, number: int = 0, **sections: str) ->
 def configurable(**other: str) -> str:
     sections = {"input": 'pin="11"', "output": 'pin="12"', "io_ctrl": 'pin="13"'}
     return gpio("io_ctrl", **{**sections, **other})
-
-
-@pytest.fixture
-def tree(tmp_path) -> Iterator[GpioTree]:
-    tree = GpioTree(tmp_path)
-    yield tree
-    tree.close()
 
 
 @pytest.fixture

@@ -1,6 +1,6 @@
 """The supervised event as any service sees it, from ports that are really measured."""
 
-from typing import Any, Iterator
+from typing import Any
 
 import pytest
 
@@ -11,7 +11,6 @@ from converters import (
     supervise,
     supervised_port,
 )
-from gpio_tree import GpioTree
 from harness import Device, Signals
 from test_events import SUPERVISED as EVENT
 from test_events import Producer
@@ -24,20 +23,12 @@ COMPARATOR = "iio:device6"
 
 
 @pytest.fixture
-def tree(tmp_path) -> Iterator[GpioTree]:
-    tree = GpioTree(tmp_path)
-    yield tree
-    tree.close()
-
-
-@pytest.fixture
 def device(make_device, tree) -> Device:
     return make_device(binds={"/sys": tree.sys})
 
 
 @pytest.fixture
-def converters(device, tree, tmp_path) -> Iterator[Converters]:
-    converters = Converters(device, tree, tmp_path)
+def converters(converters) -> Converters:
     converters.spidev()
     converters.attribute(COMPARATOR, "name", "comparator\n")
     converters.level(COMPARATOR, "in_voltage0_raw", 0x150)
@@ -45,8 +36,7 @@ def converters(device, tree, tmp_path) -> Iterator[Converters]:
         converters.attribute(COMPARATOR, f"events/in_voltage0_thresh_{name}", "")
     converters.fifo(COMPARATOR)
     converters.fifo(f"{COMPARATOR}.events")
-    yield converters
-    converters.close()
+    return converters
 
 
 def with_event(backend: str, settings: str, **options) -> str:

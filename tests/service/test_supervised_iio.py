@@ -1,8 +1,6 @@
 """Supervised inputs whose line is sampled into a buffer. The character device is a FIFO."""
 
 import struct
-from typing import Iterator
-
 import pytest
 
 from converters import (
@@ -16,7 +14,6 @@ from converters import (
     supervised_port,
     wait_readout,
 )
-from gpio_tree import GpioTree
 from harness import Device, wait_for
 
 NODE = "iio:device2"
@@ -26,28 +23,19 @@ LOST = ("read Error: ", "Readout failed: ")
 
 
 @pytest.fixture
-def tree(tmp_path) -> Iterator[GpioTree]:
-    tree = GpioTree(tmp_path)
-    yield tree
-    tree.close()
-
-
-@pytest.fixture
 def device(make_device, tree) -> Device:
     return make_device(binds={"/sys": tree.sys})
 
 
 @pytest.fixture
-def converters(device, tree, tmp_path) -> Iterator[Converters]:
-    converters = Converters(device, tree, tmp_path)
+def converters(converters, tree) -> Converters:
     make_buffer(converters)
     converters.attribute("iio:device5", "name", "adc\n")
     converters.attribute("iio:device5", "trigger/current_trigger", "\n")
     converters.attribute("trigger0", "name", "pulse\n")
     converters.attribute("trigger0", "sampling_frequency", "")
     (tree.sys / "kernel/config/iio/triggers/hrtimer").mkdir(parents=True)
-    yield converters
-    converters.close()
+    return converters
 
 
 def make_buffer(converters: Converters) -> None:

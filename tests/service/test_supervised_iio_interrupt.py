@@ -1,7 +1,5 @@
 """Supervised inputs on a converter that raises events when its level crosses a threshold."""
 
-from typing import Iterator
-
 import pytest
 
 from converters import (
@@ -15,7 +13,6 @@ from converters import (
     supervised_port,
     wait_readout,
 )
-from gpio_tree import GpioTree
 from harness import Device, wait_for
 
 ENTRY = "iio:device6"
@@ -25,20 +22,12 @@ FILES = ("rising_value", "falling_value", "rising_en", "falling_en")
 
 
 @pytest.fixture
-def tree(tmp_path) -> Iterator[GpioTree]:
-    tree = GpioTree(tmp_path)
-    yield tree
-    tree.close()
-
-
-@pytest.fixture
 def device(make_device, tree) -> Device:
     return make_device(binds={"/sys": tree.sys})
 
 
 @pytest.fixture
-def converters(device, tree, tmp_path) -> Iterator[Converters]:
-    converters = Converters(device, tree, tmp_path)
+def converters(converters) -> Converters:
     converters.attribute(ENTRY, "name", "comparator\n")
     for channel in (0, 1):
         set_raw(converters, 150, channel)
@@ -46,8 +35,7 @@ def converters(device, tree, tmp_path) -> Iterator[Converters]:
             converters.attribute(ENTRY, f"events/in_voltage{channel}_thresh_{name}", "")
     converters.fifo(ENTRY)
     converters.fifo(EVENTS)
-    yield converters
-    converters.close()
+    return converters
 
 
 def set_raw(converters: Converters, level: int, channel: int = 0) -> None:

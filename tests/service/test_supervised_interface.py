@@ -1,8 +1,6 @@
 """The supervised-input interface, on ports whose converter is a plain file."""
 
 import xml.etree.ElementTree as ElementTree
-from typing import Iterator
-
 import pytest
 
 from control import ODD_NUMBERS
@@ -19,7 +17,6 @@ from converters import (
     supervised_port,
     wait_readout,
 )
-from gpio_tree import GpioTree
 from harness import Device, port, wait_for
 
 METHODS = {
@@ -55,24 +52,15 @@ BY_FLAG = BY_NUMBER[:3]
 
 
 @pytest.fixture
-def tree(tmp_path) -> Iterator[GpioTree]:
-    tree = GpioTree(tmp_path)
-    yield tree
-    tree.close()
-
-
-@pytest.fixture
 def device(make_device, tree) -> Device:
     return make_device(binds={"/sys": tree.sys})
 
 
 @pytest.fixture
-def converters(device, tree, tmp_path) -> Iterator[Converters]:
-    converters = Converters(device, tree, tmp_path)
+def converters(converters) -> Converters:
     converters.spidev()
     converters.answer(0)
-    yield converters
-    converters.close()
+    return converters
 
 
 def spi(number: int = 0, elements: str = "", **options) -> str:

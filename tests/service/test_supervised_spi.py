@@ -1,8 +1,6 @@
 """Supervised inputs whose line is measured through an SPI converter."""
 
 import os
-from typing import Iterator
-
 import pytest
 
 from converters import (
@@ -19,7 +17,6 @@ from converters import (
     supervised_port,
     wait_readout,
 )
-from gpio_tree import GpioTree
 from harness import Device, wait_for
 
 RANGES = (
@@ -31,24 +28,15 @@ LOST = ("Error: ", "Readout failed: ")
 
 
 @pytest.fixture
-def tree(tmp_path) -> Iterator[GpioTree]:
-    tree = GpioTree(tmp_path)
-    yield tree
-    tree.close()
-
-
-@pytest.fixture
 def device(make_device, tree) -> Device:
     return make_device(binds={"/sys": tree.sys})
 
 
 @pytest.fixture
-def converters(device, tree, tmp_path) -> Iterator[Converters]:
-    converters = Converters(device, tree, tmp_path)
+def converters(converters) -> Converters:
     converters.spidev()
     converters.answer(0)
-    yield converters
-    converters.close()
+    return converters
 
 
 def spi(elements: str = RANGES, **options) -> str:
