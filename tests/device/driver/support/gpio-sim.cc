@@ -28,7 +28,7 @@ int base_of(const std::string &device) {
 
 }  // namespace
 
-GpioSim::GpioSim(std::string name, std::vector<std::string> lines)
+GpioSim::GpioSim(const std::string &name, const std::vector<std::string> &lines)
     : folder_(kSims + name), lines_(static_cast<int>(lines.size())) {
   make_folder(folder_ + "/bank0");
   write_text(folder_ + "/bank0/num_lines", std::to_string(lines_));

@@ -7,7 +7,7 @@
 class GpioSim {
  public:
   // The names of the lines, "" for a line without one.
-  GpioSim(std::string name, std::vector<std::string> lines);
+  GpioSim(const std::string &name, const std::vector<std::string> &lines);
   GpioSim(const GpioSim &) = delete;
   GpioSim &operator=(const GpioSim &) = delete;
   ~GpioSim();
