@@ -6,13 +6,16 @@ from harness import DBusError, Device, Signals, wait_for
 
 PATH = "/com/kelv/Event/pcd"
 INTERFACE = "com.kelv.Event.Producer"
+SUPERVISED = "com.kelv.Event.Pcd.SupervisedPort"
 
 
 class Producer:
     """The daemon's event producer, looked at from a neighbour service."""
 
     def __init__(self, device: Device):
+        """Returns when the producer has said what it has to say of the start."""
         self._device = device
+        self.declarations()
 
     def declarations(self) -> dict[int, dict[str, Any]]:
         (declared,) = wait_for(self._list, "the producer's object")

@@ -3,9 +3,7 @@
 import pytest
 
 from harness import Device, hwdesc, port
-from producer import Producer
-
-SUPERVISED = "com.kelv.Event.Pcd.SupervisedPort"
+from producer import SUPERVISED, Producer
 
 IOPORT = '<event declaration="IOPort"/>'
 PORT_ANY = '<event declaration="PortAny" output="false"/>'

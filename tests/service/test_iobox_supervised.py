@@ -5,6 +5,7 @@ import pytest
 from converters import expect_supervised_error, readout, supervise, supervised
 from harness import Device, hwdesc, port, wait_for
 from neighbours import IoBox, neighbourhood_fixture
+from producer import Producer
 
 neighbourhood = pytest.fixture(neighbourhood_fixture)
 
@@ -80,7 +81,7 @@ def test_each_state_of_the_line_is_read_without_a_level(device, box, word, activ
 def test_an_unlisted_word_is_the_undefined_state(device, box):
     supervise(device, number=INPUT)
     report(device, box, "cut")
-    with device.signals("Sent", "com.kelv.Event.Producer", "/com/kelv/Event/pcd") as sent:
+    with Producer(device).signals("Sent") as sent:
         assert report(device, box, "ajar") is False
         _id, event = sent.wait()
     assert readout(device, INPUT) == ("undefined", 0)

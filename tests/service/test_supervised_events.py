@@ -12,8 +12,8 @@ from converters import (
     supervised_port,
 )
 from harness import Device, Signals
-from test_events import SUPERVISED as EVENT
-from test_events import Producer
+from producer import SUPERVISED as EVENT
+from producer import Producer
 
 RANGES = "".join(
     range_element(state, lower, lower + 0xFF)
