@@ -1,7 +1,13 @@
-"""Runs the daemon in a simulated device and shows what its clients see."""
+"""Runs the daemon in a simulated device and shows what its clients see.
+
+On a terminal that is the live table of "portctl watch", elsewhere lines.
+"""
 
 import argparse
+import errno
+import os
 import signal
+import subprocess
 import sys
 import tempfile
 import time
@@ -11,73 +17,16 @@ from typing import Optional
 sys.path.insert(0, str(Path(__file__).resolve().parent.parent / "tests/service"))
 
 from gi.repository import GLib  # noqa: E402
-from harness import DBusError, Device, PortChanged, PortProps, become_root, wait_for  # noqa: E402
-from neighbours import IoBox, Neighbourhood, Streamer  # noqa: E402
-
-DOOR, MOTION, MODULE = "/run/demo/door", "/run/demo/motion", "/run/demo/module"
-PLUG = "/run/demo/plug"
-RELAY, CONFIGURABLE, ALARM, BOX, TRIGGER = 3, 4, 5, 8, 21
+from harness import DBusError, Device, NoMounts, PortChanged, PortProps, become_root, wait_for  # noqa: E402
+from life import SUPERVISED_INTERFACE, Life, make_device  # noqa: E402
+from neighbours import Neighbourhood  # noqa: E402
 
 EVENT_PATH, EVENT_INTERFACE = "/com/kelv/Event/pcd", "com.kelv.Event.Producer"
 CONNECTOR, CONNECTOR_PATH = "com.kelv.PCD.Connector", "/com/kelv/PCD/Connector"
 
+_ENDS = (signal.SIGINT, signal.SIGTERM, signal.SIGHUP)
+
 Names = dict[int, tuple[str, str]]  # by port number: as an input, as an output
-
-
-class Life:
-    """The simulated device: inputs that move by themselves, and a client that switches outputs."""
-
-    def __init__(self, device: Device, neighbourhood: Neighbourhood):
-        self._device = device
-        self._neighbourhood = neighbourhood
-        self._tick = 0
-        self._states = {DOOR: False, RELAY: False, ALARM: False, BOX: False, TRIGGER: False}
-
-    def prepare(self) -> None:
-        self._device.conf((Path(__file__).parent / "conf.xml").read_text())
-        for attribute, value in ((DOOR, 0), (MOTION, 0), (PLUG, 1)):
-            self._device.write(attribute, f"{value}\n").chmod(0o666)
-        self._box = IoBox(self._neighbourhood, self._device)
-        Streamer(self._neighbourhood, self._device, {1: True, 2: True})
-
-    def tick(self) -> bool:
-        """One second of the device's life."""
-        self._tick += 1
-        if self._tick % 3 == 0:
-            self._device.write(DOOR, f"{int(self._toggle(DOOR))}\n")
-        if self._tick % 4 == 0:
-            self._client("SetState", "ub", RELAY, self._toggle(RELAY))
-        if self._tick % 5 == 0:
-            self._device.write(MOTION, "1\n")
-        if self._tick % 7 == 0:
-            self._client("SetVirtual", "ub", ALARM, self._toggle(ALARM))
-        if self._tick % 5 == 1:
-            self._box.report(BOX, "closed" if self._toggle(BOX) else "open")
-        if self._tick % 5 == 3:
-            self._client("SetVirtual", "ub", TRIGGER, self._toggle(TRIGGER))
-        if self._tick == 6:
-            self._plug_in()
-        if self._tick % 9 == 0:
-            self._turn_round()
-        return GLib.SOURCE_CONTINUE
-
-    def _toggle(self, what: str | int) -> bool:
-        self._states[what] = not self._states[what]
-        return self._states[what]
-
-    def _client(self, method: str, signature: str = "", *args) -> None:
-        shown = ", ".join(str(arg) for arg in args)
-        print(f"        client: {method}({shown})", flush=True)
-        self._device.begin_call(method, signature, *args)
-
-    def _plug_in(self) -> None:
-        print("        device: a module is plugged in", flush=True)
-        self._device.write(MODULE, "1\n")
-        self._client("RefreshIOPorts")
-
-    def _turn_round(self) -> None:
-        direction = "output" if self._tick % 2 else "input"
-        self._client("SetDirection", "us", CONFIGURABLE, direction)
 
 
 def role(port: PortProps) -> str:
@@ -100,6 +49,14 @@ def names_of(device: Device, number: int, identifier: str = "") -> tuple[str, st
 def connector_states(device: Device) -> list[int]:
     arguments = ("GetConnectorStates", "s", "video connector")
     return device.bus.call(CONNECTOR, CONNECTOR_PATH, CONNECTOR, *arguments)
+
+
+def all_plugged_in(device: Device) -> bool:
+    try:
+        return all(connector_states(device))
+    except DBusError:
+        # The name may come before the object.
+        return False
 
 
 def print_table(device: Device) -> Names:
@@ -136,17 +93,34 @@ def print_event(sent: tuple, elapsed: float) -> None:
     print(f"{elapsed:6.1f}s  event {number}: {shown}", flush=True)
 
 
-def watch(device: Device, neighbourhood: Neighbourhood, seconds: Optional[float]) -> None:
+class End:
+    """When to end: somebody interrupts, the time is up, or the daemon has ended.
+
+    An interrupt that comes while a callback of the main loop runs would be lost as an exception.
+    """
+
+    def __init__(self, device: Device, seconds: Optional[float]):
+        self._device = device
+        self._deadline = float("inf") if seconds is None else time.monotonic() + seconds
+        self._interrupted = False
+        for number in _ENDS:
+            GLib.unix_signal_add(GLib.PRIORITY_DEFAULT, number, self._interrupt)
+
+    def _interrupt(self) -> bool:
+        self._interrupted = True
+        return GLib.SOURCE_CONTINUE
+
+    def reached(self) -> bool:
+        time_is_up = time.monotonic() >= self._deadline
+        return self._interrupted or time_is_up or not self._device.running
+
+
+def print_lines(device: Device, life: Life, end: End) -> None:
     """Shows every change and every event until the time is up or somebody interrupts."""
-    life = Life(device, neighbourhood)
-    life.prepare()
-    device.start()
-    wait_for(lambda: all(connector_states(device)), "the first look at the connector")
     events = device.signals("Sent", interface=EVENT_INTERFACE, path=EVENT_PATH)
     with device.signals() as signals, events:
         names = print_table(device)
         begin = time.monotonic()
-        ticker = GLib.timeout_add_seconds(1, life.tick)
 
         def over() -> bool:
             for change in signals.take():
@@ -156,39 +130,134 @@ def watch(device: Device, neighbourhood: Neighbourhood, seconds: Optional[float]
                 print_change(change, names, time.monotonic() - begin)
             for sent in events.take():
                 print_event(sent, time.monotonic() - begin)
-            time_is_up = seconds is not None and time.monotonic() - begin >= seconds
-            return time_is_up or not device.running
+            life.restart_if_due()
+            return end.reached()
 
+        wait_for(over, "the end of the demo", float("inf"))
+
+
+def say_line(text: str) -> None:
+    print(f"        {text}", flush=True)
+
+
+class LiveTable:
+    """portctl watch on our terminal, which also shows what we say."""
+
+    def __init__(self, device: Device, portctl: Path, folder: Path):
+        self._notes = folder / "notes"
+        os.mkfifo(self._notes)
+        # For a second terminal. A socket's path must be short, and the folder's may be long.
+        self._helper = folder / "portctl"
+        bus = folder / "bus"
+        bus.symlink_to(device.sandbox.under_root("/run/dbus/system_bus_socket"))
+        self._helper.write_text(
+            f'#!/bin/sh\nexec 9<"{folder}"\n'
+            f'exec "{portctl}" --address unix:path=/proc/self/fd/9/{bus.name} "$@"\n'
+        )
+        self._helper.chmod(0o755)
+        folder.chmod(0o755)
+        self._command = [
+            portctl, "--address", device.bus.address, "watch", "--title", "portd demo",
+            "--notes", self._notes,
+        ]  # fmt: skip
+        self._file = os.open(self._notes, os.O_RDWR | os.O_NONBLOCK)
+        self._process: Optional[subprocess.Popen] = None
+
+    def start(self) -> None:
+        self._process = subprocess.Popen(self._command)
+        self.say("A device lives here: q ends it. See what happens below the table.")
+        self.say(f"Talk to it from a second terminal: {self._helper} set relay on")
+
+    def say(self, text: str) -> None:
         try:
-            wait_for(over, "the end of the demo", float("inf"))
-        finally:
-            GLib.source_remove(ticker)
+            os.write(self._file, f"- {text}\n".encode())
+        except BlockingIOError:
+            pass  # nobody reads: the table is about to end
+
+    @property
+    def running(self) -> bool:
+        return self._process is not None and self._process.poll() is None
+
+    def close(self) -> int:
+        if self._process is not None:
+            if self.running:
+                self._process.terminate()
+            self._process.wait()
+        os.close(self._file)
+        return self._process.returncode if self._process else 0
+
+
+def show_table(life: Life, table: LiveTable, end: End) -> None:
+    table.start()
+
+    def over() -> bool:
+        life.restart_if_due()
+        return end.reached() or not table.running
+
+    wait_for(over, "the end of the demo", float("inf"))
+
+
+def run(arguments: argparse.Namespace, device: Device, life: Life, folder: Path) -> int:
+    device.start()
+    wait_for(lambda: all_plugged_in(device), "the first look at the connector")
+    device.wait_name(SUPERVISED_INTERFACE)
+    end = End(device, arguments.seconds)
+    if not (sys.stdout.isatty() and sys.stdin.isatty()):
+        life.begin(say_line)
+        print_lines(device, life, end)
+        return 0
+    table = LiveTable(device, arguments.portctl, folder)
+    try:
+        life.begin(table.say)
+        show_table(life, table, end)
+    finally:
+        status = table.close()
+    return status
 
 
 def parse_arguments() -> argparse.Namespace:
     parser = argparse.ArgumentParser(prog="demo", description=__doc__)
     parser.add_argument("--binary", type=Path, required=True, help=argparse.SUPPRESS)
     parser.add_argument("--seconds", type=float, help="end by itself after this time")
-    return parser.parse_args()
+    arguments = parser.parse_args()
+    arguments.portctl = (arguments.binary.parent / "portctl/portctl").absolute()
+    return arguments
 
 
 def main() -> int:
     arguments = parse_arguments()
-    signal.signal(signal.SIGTERM, signal.getsignal(signal.SIGINT))
-    become_root()
-    with tempfile.TemporaryDirectory(prefix="portd-demo-") as folder:
-        device = Device(Path(folder), arguments.binary)
+    for number in _ENDS:
+        signal.signal(number, signal.default_int_handler)
+    try:
+        become_root()
+    except NoMounts as error:
+        print(error, file=sys.stderr)
+        return 1
+    status = 0
+    with tempfile.TemporaryDirectory(prefix="portd-demo-") as name:
+        folder = Path(name)
         neighbourhood = Neighbourhood()
+        parts = make_device(folder / "device", arguments.binary)
+        life = Life(parts, neighbourhood)
         try:
-            watch(device, neighbourhood, arguments.seconds)
+            life.prepare()
+            status = run(arguments, parts.device, life, folder)
         except KeyboardInterrupt:
-            print()
+            pass
+        except OSError as error:
+            # The terminal is gone: nobody is left to tell.
+            if error.errno not in (errno.EIO, errno.EPIPE):
+                raise
         finally:
+            # A second signal must not cut the cleaning up short.
+            for number in _ENDS:
+                signal.signal(number, signal.SIG_IGN)
+            life.end()
             neighbourhood.close()
-            problems = device.close()
+            problems = parts.close()
     for problem in problems:
         print(problem, file=sys.stderr)
-    return 1 if problems else 0
+    return 1 if problems or status else 0
 
 
 sys.exit(main())

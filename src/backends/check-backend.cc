@@ -4,8 +4,6 @@
 
 #include <algorithm>
 
-#include "backends/tables.h"
-
 namespace {
 
 CheckBackendData *data_of(IOPort *ioport) {
@@ -40,23 +38,14 @@ void set_property(IOPort *ioport, const char *section, const char *key, const ch
   data_of(ioport)->properties.push_front({section, key, value});
 }
 
-void free_data(IOPort *ioport) {
-  io_port_set_backend_data(ioport, nullptr);
-}
+}  // namespace
 
-constexpr PortFunctions kFunctions = {
+extern constexpr PortFunctions kCheckBackend = {
+    .make_record = make_backend_record<CheckBackendData>,
     .setup = setup,
     .get_state = get_state,
     .set_state = set_state,
     .start_watch = start_watch,
     .set_direction = set_direction,
     .set_property = set_property,
-    .free = free_data,
 };
-
-}  // namespace
-
-const PortFunctions *check_backend_functions(IOPort *ioport) {
-  io_port_make_backend_data<CheckBackendData>(ioport);
-  return &kFunctions;
-}

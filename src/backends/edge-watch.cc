@@ -14,6 +14,25 @@ constexpr gulong kSettleTime = 500;  // microseconds between an edge and the fir
 constexpr int kRoundsPerTurn = 64;
 constexpr guint kRetryInterval = 1000;  // milliseconds between two looks at an unreadable line
 
+// A source that does nothing until it is made ready, and then runs once.
+gboolean run_once(GSource *source, GSourceFunc callback, gpointer user_data) {
+  g_source_set_ready_time(source, -1);
+  return callback(user_data);
+}
+
+GSource *new_wake_source(GSourceFunc callback, gpointer user_data) {
+  static GSourceFuncs functions = {.prepare = nullptr,
+                                   .check = nullptr,
+                                   .dispatch = run_once,
+                                   .finalize = nullptr,
+                                   .closure_callback = nullptr,
+                                   .closure_marshal = nullptr};
+  GSource *source = g_source_new(&functions, sizeof(GSource));
+  g_source_set_callback(source, callback, user_data, nullptr);
+  g_source_attach(source, nullptr);
+  return source;
+}
+
 }  // namespace
 
 void EdgeWatch::start(IOPort *port, const GpioPin *pin) {
@@ -25,7 +44,7 @@ void EdgeWatch::start(IOPort *port, const GpioPin *pin) {
   pin_ = pin;
   if (told_ == kNone) {
     // Nobody was told of earlier levels: changes count from here.
-    note(libugpio_get_gpio_pin(pin));
+    see(libugpio_get_gpio_pin(pin));
     told_ = seen_;
   }
   arm();
@@ -35,6 +54,7 @@ void EdgeWatch::stop() {
   const std::lock_guard guard(handles_);
   watch_.reset();
   recheck_.reset();
+  wake_.reset();
   pin_ = nullptr;
   seen_ = told_ = kNone;
   was_hidden_ = false;
@@ -57,46 +77,69 @@ int EdgeWatch::read(const GpioPin *pin) {
 void EdgeWatch::arm() {
   const int fd = libugpio_gpio_pin_fd(pin_);
   watch_ = fd >= 0 ? Source(g_unix_fd_add(fd, condition_, on_signal, this)) : Source();
+  // Behind the watch: an edge that is signalled as well is served first, and serves for both.
+  wake_.reset(new_wake_source(on_wake, this));
+  if (was_hidden_ || seen_ != told_) {
+    look_soon();
+  }
+}
+
+void EdgeWatch::see(int level) {
+  seen_ = level < 0 ? kUnreadable : (level != 0 ? 1 : 0);
 }
 
 void EdgeWatch::note(int level) {
-  seen_ = level < 0 ? kUnreadable : (level != 0 ? 1 : 0);
+  see(level);
   if (!watch_ || settling_ || seen_ == told_) {
     return;
   }
   if (seen_ == kUnreadable) {
     if (!recheck_) {
-      recheck_later();
+      look_soon();
     }
   } else if (!was_hidden_) {
-    was_hidden_ = true;
-    recheck_soon();
+    report_soon();
   }
 }
 
-void EdgeWatch::recheck_soon() {
-  recheck_ = Source(g_idle_add_full(G_PRIORITY_DEFAULT, on_recheck, this, nullptr));
+void EdgeWatch::look_soon() {
+  if (wake_) {
+    g_source_set_ready_time(wake_.get(), 0);
+  }
+}
+
+void EdgeWatch::report_soon() {
+  was_hidden_ = true;
+  look_soon();
 }
 
 void EdgeWatch::recheck_later() {
   recheck_ = Source(g_timeout_add(kRetryInterval, on_recheck, this));
 }
 
+gboolean EdgeWatch::on_wake(gpointer self) {
+  static_cast<EdgeWatch *>(self)->look_again();
+  return G_SOURCE_CONTINUE;
+}
+
 gboolean EdgeWatch::on_recheck(gpointer self) {
   auto *watch = static_cast<EdgeWatch *>(self);
-  if (watch->wants_report()) {
-    watch->settle();
-  }
+  watch->look_again();
   return G_SOURCE_REMOVE;
+}
+
+void EdgeWatch::look_again() {
+  if (wants_report()) {
+    settle();
+  }
 }
 
 // After a read that failed the line may be as it was reported: that is no news.
 bool EdgeWatch::wants_report() {
   const std::lock_guard guard(handles_);
-  recheck_.reset();  // the one that runs, or what another reader has put in its place meanwhile
-  const int level = libugpio_get_gpio_pin(pin_);
-  if (level < 0) {
-    seen_ = kUnreadable;
+  recheck_.reset();  // also the one that runs
+  see(libugpio_get_gpio_pin(pin_));
+  if (seen_ == kUnreadable) {
     recheck_later();
     return false;
   }
@@ -104,7 +147,6 @@ bool EdgeWatch::wants_report() {
   if (!was_followed) {
     arm();
   }
-  seen_ = level != 0 ? 1 : 0;
   return !was_followed || was_hidden_ || seen_ != told_;
 }
 
@@ -120,6 +162,9 @@ void EdgeWatch::begin_settling() {
   settling_ = true;
   was_hidden_ = false;
   recheck_.reset();
+  if (wake_) {
+    g_source_set_ready_time(wake_.get(), -1);
+  }
 }
 
 // A line that does not come to rest is left after some rounds, to be looked at again soon.
@@ -143,8 +188,7 @@ void EdgeWatch::end_settling() {
   if (seen_ == kUnreadable) {
     recheck_later();
   } else if (seen_ != told_) {
-    was_hidden_ = true;
-    recheck_soon();
+    report_soon();
   }
 }
 

@@ -8,6 +8,7 @@
 
 #include <glib.h>
 
+#include <memory>
 #include <mutex>
 
 #include "backends/libugpio-utils.h"
@@ -36,11 +37,22 @@ class EdgeWatch {
   static constexpr int kUnreadable = -2;  // the last read failed
 
   static gboolean on_signal(gint fd, GIOCondition condition, gpointer self);
+  static gboolean on_wake(gpointer self);
   static gboolean on_recheck(gpointer self);
 
+  struct DestroySource {
+    void operator()(GSource *source) const {
+      g_source_destroy(source);
+      g_source_unref(source);
+    }
+  };
+
+  void look_soon();
+  void look_again();
   void arm();
+  void see(int level);
   void note(int level);
-  void recheck_soon();
+  void report_soon();
   void recheck_later();
   bool wants_report();
   void settle();
@@ -51,13 +63,17 @@ class EdgeWatch {
 
   std::mutex &handles_;
   const GIOCondition condition_;
-  // All that follows is guarded by `handles_`.
+  // All that follows is guarded by `handles_`, also what only the main thread changes.
   IOPort *port_ = nullptr;
   const GpioPin *pin_ = nullptr;
   int seen_ = kNone;         // what the line last read
   int told_ = kNone;         // what it read when its state was last reported
   bool settling_ = false;    // its changes are being read and reported
-  bool was_hidden_ = false;  // a change was acknowledged by another reader
-  Source watch_;             // of the line's descriptor
-  Source recheck_;           // the line must be looked at without an edge
+  bool was_hidden_ = false;  // a change was read and not reported
+  // Main thread only: sources belong to its loop.
+  Source watch_;    // of the line's descriptor
+  Source recheck_;  // an unreadable line must be looked at again
+  // The line must be looked at without an edge. Made and destroyed by the main thread; any thread
+  // may make it ready.
+  std::unique_ptr<GSource, DestroySource> wake_;
 };

@@ -1,80 +1,65 @@
 #include "backends/iobox-backend.h"
 
-#include <algorithm>
-#include <iterator>
+#include <optional>
+#include <string>
 #include <string_view>
+#include <vector>
 
-#include "backends/tables.h"
+#include "backends/iobox-calls.h"
 #include "base/log.h"
+#include "base/main-queue.h"
 #include "base/patience.h"
+#include "base/signal-handler.h"
+#include "base/worker.h"
+#include "port/port-work.h"
 
 namespace {
 
 constexpr const char *kService = "com.kelv.IOBoxMonitor";
 constexpr const char *kObject = "/com/kelv/IOBoxMonitor";
 
-// Log readers know these messages by function and line, so both are part of the text.
-struct Place {
-  const char *function;
-  int line;
-};
-constexpr Place kCallFailed = {"iobox_dbus_call", 44};
-constexpr Place kBadWord = {"iobox_state_to_portd_state", 67};
-constexpr Place kNoProxy = {"iobox_port_setup", 168};
-constexpr Place kNoConnectionStatus = {"iobox_port_setup", 180};
-constexpr Place kNoPortStatus = {"iobox_port_setup", 193};
-constexpr Place kNoInitialState = {"iobox_port_setup", 219};
-constexpr Place kNoHandler = {"iobox_port_setup", 237};
+constexpr IoBoxPlace kNoProxy = {"iobox_port_setup", 168};
+constexpr IoBoxPlace kNoInitialState = {"iobox_port_setup", 219};
+constexpr IoBoxPlace kNoHandler = {"iobox_port_setup", 237};
 
-#define log_place(level, place, format, ...) \
-  log_at((level), "%s@%d: " format, (place).function, (place).line __VA_OPT__(, ) __VA_ARGS__)
-
-struct StateWord {
-  std::string_view word;
-  SupervisedRangeState state;
-};
-
-constexpr StateWord kStateWords[] = {
-    {"closed", SUPERVISED_STATE_CLOSED},
-    {"cut", SUPERVISED_STATE_CUT},
-    {"short", SUPERVISED_STATE_SHORT},
-    {"open", SUPERVISED_STATE_OPEN},
-};
-
-IoBoxBackendData *data_of(IOPort *ioport) {
+IoBoxBackendData *data_of(const IOPort *ioport) {
   return static_cast<IoBoxBackendData *>(io_port_backend_data(ioport));
 }
 
-// --- Calls of the service ---
+// --- The service ---
 
-// One for all ports: they wait for the same process.
-Patience &patience() {
-  static Patience instance;
+// The proxy is used by the worker while it stays as it is; the rest is of the main thread.
+struct Monitor {
+  GObjectPtr<GDBusProxy> proxy;
+  SignalHandler signals;
+  SignalHandler owner;
+  std::vector<IOPort *> ports;       // those that follow the box
+  std::weak_ptr<Patience> patience;  // of the set-ups that are under way
+  Worker worker{"I/O box"};          // last: its jobs end before what they use goes
+};
+
+Monitor &monitor() {
+  static Monitor instance;
   return instance;
 }
 
-// Null when there was no answer, which is logged. Any thread.
-GVariantPtr iobox_dbus_call(IoBoxBackendData *data, const char *method, GVariant *parameters) {
-  Error error;
-  GVariantPtr reply =
-      call_with_patience(patience(), data->proxy.get(), method, parameters, error.out());
-  if (!reply) {
-    log_place(kLogLevelUser, kCallFailed, "Failed to call method %s: %s", method, error.message());
-  }
-  return reply;
+// For a call that waits as long as the bus allows. On the worker's thread.
+IoBoxCall unhurried(GCancellable *cancellable) {
+  return {monitor().proxy.get(), cancellable, nullptr};
 }
 
-// The same for a reply of known type. Another one counts as no answer.
-GVariantPtr call_for(IoBoxBackendData *data, const char *method, GVariant *parameters,
-                     const char *type) {
-  GVariantPtr reply = iobox_dbus_call(data, method, parameters);
-  if (reply && !g_variant_is_of_type(reply.get(), G_VARIANT_TYPE(type))) {
-    log_warning("The I/O box monitor answers %s with %s, not with %s", method,
-                g_variant_get_type_string(reply.get()), type);
-    reply.reset();
-  }
-  return reply;
+void unfollow(IoBoxBackendData *data) {
+  std::erase(monitor().ports, std::exchange(data->follower, nullptr));
 }
+
+void follow(IOPort *ioport) {
+  IoBoxBackendData *data = data_of(ioport);
+  unfollow(data);
+  data->follower = ioport;
+  monitor().ports.push_back(ioport);
+}
+
+// --- Modes ---
 
 const char *mode_word(const IOPort *ioport) {
   if (!io_port_input(ioport)) {
@@ -83,119 +68,216 @@ const char *mode_word(const IOPort *ioport) {
   return io_port_supervised_input(ioport) ? "supervised_in" : "in";
 }
 
-// Any thread.
+IoBoxMode mode_of(const IOPort *ioport) {
+  return {io_port_get_number(ioport), data_of(ioport)->output_value, mode_word(ioport)};
+}
+
+// Any thread. The box is told in the order of the calls of this.
 void iobox_set_mode(IOPort *ioport) {
   IoBoxBackendData *data = data_of(ioport);
-  if (!data->proxy) {
+  if (!data->connected) {
     return;
   }
+  const auto work = std::make_shared<PortWork>(ioport);
   const std::lock_guard lock(data->mode_lock);
-  iobox_dbus_call(data, "SetIOMode",
-                  g_variant_new("(iis)", io_port_get_number(ioport), data->output_value.load(),
-                                mode_word(ioport)));
+  monitor().worker.queue([work, mode = mode_of(ioport)](GCancellable *cancellable) {
+    iobox_send_mode(unhurried(cancellable), mode);
+  });
+}
+
+void note_level(IoBoxBackendData *data, std::int32_t level) {
+  data->state = level > 0 ? SUPERVISED_STATE_CLOSED : SUPERVISED_STATE_OPEN;
+}
+
+// Any thread. The level counts from now on, however long the box takes.
+void drive(IOPort *ioport, std::int32_t level) {
+  IoBoxBackendData *data = data_of(ioport);
+  note_level(data, level);
+  data->output_value = level;
+  iobox_set_mode(ioport);
+}
+
+// --- What the box says ---
+
+void take_state(IOPort *ioport, SupervisedRangeState state) {
+  IoBoxBackendData *data = data_of(ioport);
+  const auto now = static_cast<std::int32_t>(state);
+  if (data->state.exchange(now) != now && data->watching) {
+    io_port_report_line(ioport, state);
+  }
+}
+
+// A question for the state of an input, on its way to the box and back. While it is, the port may
+// be set up anew or become an output, and a signal may overtake the answer: where one was heard
+// since the question left, the answer says nothing newer.
+struct Question {
+  IOPort *ioport = nullptr;
+  IoBoxHeard heard;  // also tells one set-up of the port from the next
+  unsigned heard_before = 0;
+};
+
+bool still_asked(const Question &question) {
+  const IoBoxBackendData *data = data_of(question.ioport);
+  return data && data->heard == question.heard && *question.heard == question.heard_before;
+}
+
+std::optional<SupervisedRangeState> ask_state(const IoBoxCall &call, int number,
+                                              Question &question) {
+  question.heard_before = *question.heard;
+  return iobox_ask_state(call, number);
+}
+
+void on_proxy_signal(GDBusProxy * /*proxy*/, const char * /*sender*/, const char *signal,
+                     GVariant *parameters, gpointer /*user_data*/) {
+  for (IOPort *ioport : std::vector<IOPort *>(monitor().ports)) {
+    iobox_handle_signal(ioport, signal, parameters);
+  }
+}
+
+// --- A service that is started anew knows neither modes nor whom it has told of which state ---
+
+void tell_anew(IOPort *ioport) {
+  const auto work = std::make_shared<PortWork>(ioport);
+  Question question = {ioport, data_of(ioport)->heard, 0};
+  const std::lock_guard lock(data_of(ioport)->mode_lock);
+  monitor().worker.queue([work, question, mode = mode_of(ioport),
+                          input = io_port_input(ioport)](GCancellable *cancellable) mutable {
+    const IoBoxCall call = unhurried(cancellable);
+    iobox_send_mode(call, mode);
+    const auto state = input ? ask_state(call, mode.number, question) : std::nullopt;
+    if (state) {
+      post_to_main_loop([work, question, state] {
+        if (still_asked(question) && io_port_input(question.ioport)) {
+          take_state(question.ioport, *state);
+        }
+      });
+    }
+  });
+}
+
+void on_owner_changed(GObject *proxy, GParamSpec * /*property*/, gpointer /*user_data*/) {
+  if (!GCharPtr(g_dbus_proxy_get_name_owner(G_DBUS_PROXY(proxy)))) {
+    return;
+  }
+  for (IOPort *ioport : monitor().ports) {
+    if (io_port_is_set_up(ioport)) {
+      tell_anew(ioport);
+    }
+  }
 }
 
 // --- Set-up ---
 
-// The proxy leaves it to the first call to have the service started, so that the wait for that has
-// a limit too.
-bool make_proxy(IoBoxBackendData *data) {
-  if (!data->proxy) {
+// Waits for the bus alone: the first call has the service started.
+bool make_proxy() {
+  Monitor &box = monitor();
+  if (!box.proxy) {
     Error error;
-    data->proxy.reset(g_dbus_proxy_new_for_bus_sync(
+    box.proxy.reset(g_dbus_proxy_new_for_bus_sync(
         G_BUS_TYPE_SYSTEM,
         static_cast<GDBusProxyFlags>(G_DBUS_PROXY_FLAGS_DO_NOT_LOAD_PROPERTIES |
                                      G_DBUS_PROXY_FLAGS_DO_NOT_AUTO_START_AT_CONSTRUCTION),
         nullptr, kService, kObject, kService, nullptr, error.out()));
   }
-  if (!data->proxy) {
-    log_place(G_LOG_LEVEL_MESSAGE, kNoProxy, "Proxy for %s not available", kService);
-  }
-  return static_cast<bool>(data->proxy);
-}
-
-bool box_is_connected(IoBoxBackendData *data) {
-  const GVariantPtr reply = call_for(data, "GetIOBoxConnected", nullptr, "(b)");
-  if (!reply) {
-    log_place(kLogLevelUser, kNoConnectionStatus, "Could not get IO box connection status");
+  if (!box.proxy) {
+    log_iobox(G_LOG_LEVEL_MESSAGE, kNoProxy, "Proxy for %s not available", kService);
     return false;
   }
-  gboolean connected = FALSE;
-  g_variant_get(reply.get(), "(b)", &connected);
-  return connected;
-}
-
-GVariantPtr call_with_number(IOPort *ioport, const char *method) {
-  return call_for(data_of(ioport), method, g_variant_new("(i)", io_port_get_number(ioport)), "(s)");
-}
-
-bool port_is_enabled(IOPort *ioport) {
-  const GVariantPtr reply = call_with_number(ioport, "GetIOPortStatus");
-  if (!reply) {
-    log_place(kLogLevelUser, kNoPortStatus, "Could not get IO port status");
-    return false;
+  if (!box.signals) {
+    box.signals = SignalHandler(box.proxy.get(), "g-signal", G_CALLBACK(on_proxy_signal), nullptr);
+    box.owner = SignalHandler(box.proxy.get(), "notify::g-name-owner", G_CALLBACK(on_owner_changed),
+                              nullptr);
   }
-  const char *status = nullptr;
-  g_variant_get(reply.get(), "(&s)", &status);
-  return std::string_view(status) == "enabled";
-}
-
-bool read_initial_state(IOPort *ioport) {
-  const GVariantPtr reply = call_with_number(ioport, "GetIOState");
-  if (!reply) {
-    log_place(kLogLevelUser, kNoInitialState, "Could not get initial IO state");
-    return false;
-  }
-  const char *word = nullptr;
-  g_variant_get(reply.get(), "(&s)", &word);
-  data_of(ioport)->state = iobox_state_to_portd_state(word);
   return true;
 }
 
-void drive(IOPort *ioport, std::int32_t level) {
-  IoBoxBackendData *data = data_of(ioport);
-  data->state = level > 0 ? SUPERVISED_STATE_CLOSED : SUPERVISED_STATE_OPEN;
-  data->output_value = level;
-  iobox_set_mode(ioport);
-}
-
-void on_proxy_signal(GDBusProxy * /*proxy*/, const char * /*sender*/, const char *signal,
-                     GVariant *parameters, gpointer user_data) {
-  iobox_handle_signal(static_cast<IOPort *>(user_data), signal, parameters);
-}
-
-// Once per proxy: a port that is set up again keeps the handler that it has.
-void follow_signals(IOPort *ioport) {
-  IoBoxBackendData *data = data_of(ioport);
-  if (!data->handler) {
-    data->handler =
-        SignalHandler(data->proxy.get(), "g-signal", G_CALLBACK(on_proxy_signal), ioport);
+// Set-ups that wait behind each other, at start or in a refresh, share their patience.
+std::shared_ptr<Patience> shared_patience() {
+  auto patience = monitor().patience.lock();
+  if (!patience) {
+    patience = std::make_shared<Patience>();
+    monitor().patience = patience;
   }
-  if (!data->handler) {
-    log_place(G_LOG_LEVEL_WARNING, kNoHandler, "Failed to setup signal handler");
+  return patience;
+}
+
+// A port that is being set up, on its way to the worker and back.
+struct SetUp {
+  std::shared_ptr<PortWork> work;
+  std::shared_ptr<Patience> patience;
+  Question question;
+  IoBoxMode mode{};
+  bool input = false;
+  bool usable = false;                        // the port's events are on
+  std::optional<SupervisedRangeState> state;  // of an input
+};
+
+// On the worker's thread.
+void ask_box(SetUp &set_up, GCancellable *cancellable) {
+  const IoBoxCall call = {monitor().proxy.get(), cancellable, set_up.patience.get()};
+  set_up.usable = iobox_is_connected(call) && iobox_port_is_enabled(call, set_up.mode.number);
+  if (!set_up.usable) {
+    return;
+  }
+  if (!set_up.input) {
+    iobox_send_mode(call, set_up.mode);
+    return;
+  }
+  set_up.state = ask_state(call, set_up.mode.number, set_up.question);
+  if (!set_up.state) {
+    log_iobox(kLogLevelUser, kNoInitialState, "Could not get initial IO state");
   }
 }
 
+// The state comes before the events, which say at once how the port is.
+void finish_set_up(const SetUp &set_up) {
+  IOPort *ioport = set_up.question.ioport;
+  IoBoxBackendData *data = data_of(ioport);
+  if (!data || data->heard != set_up.question.heard) {
+    return;
+  }
+  const bool works = set_up.usable && (!set_up.input || set_up.state);
+  if (!set_up.input) {
+    data->output_value = set_up.mode.level;
+    note_level(data, set_up.mode.level);
+  } else if (set_up.state && still_asked(set_up.question)) {
+    data->state = *set_up.state;
+  }
+  if (works) {
+    io_port_finish_setup(ioport);
+  } else {
+    unfollow(data);
+  }
+  io_port_set_events_enabled(ioport, set_up.usable);
+  if (works && !monitor().signals) {
+    log_iobox(G_LOG_LEVEL_WARNING, kNoHandler, "Failed to setup signal handler");
+  }
+}
+
+// Signals are followed from here on, so that none is lost while the box is asked.
 bool iobox_port_setup(IOPort *ioport, bool initial_level) {
   IoBoxBackendData *data = data_of(ioport);
   data->connected = false;
+  data->watching = false;
   io_port_set_events_enabled(ioport, false);
-  if (!make_proxy(data)) {
+  if (!make_proxy()) {
     return false;
   }
   data->connected = true;
   data->state = SUPERVISED_STATE_UNDEFINED;
-  if (!box_is_connected(data) || !port_is_enabled(ioport)) {
-    return false;
-  }
-  io_port_set_events_enabled(ioport, true);
-  if (!io_port_input(ioport)) {
-    drive(ioport, initial_level);
-  } else if (!read_initial_state(ioport)) {
-    return false;
-  }
-  follow_signals(ioport);
-  return true;
+  data->heard = std::make_shared<std::atomic<unsigned>>(0U);
+  follow(ioport);
+  SetUp set_up;
+  set_up.work = std::make_shared<PortWork>(ioport);
+  set_up.patience = shared_patience();
+  set_up.question = {ioport, data->heard, 0};
+  set_up.mode = {io_port_get_number(ioport), initial_level, mode_word(ioport)};
+  set_up.input = io_port_input(ioport);
+  monitor().worker.queue([set_up](GCancellable *cancellable) mutable {
+    ask_box(set_up, cancellable);
+    post_to_main_loop([set_up] { finish_set_up(set_up); });
+  });
+  return false;  // not yet
 }
 
 // --- Supervision: the box judges the line by itself, so the ranges are only kept ---
@@ -251,43 +333,18 @@ void start_watch(IOPort *ioport) {
   data_of(ioport)->watching = true;
 }
 
-void set_direction(IOPort *ioport, bool /*input*/) {
+// An output has the level that the box is told, not the state that the line had as an input.
+void set_direction(IOPort *ioport, bool input) {
+  if (!input) {
+    note_level(data_of(ioport), data_of(ioport)->output_value);
+  }
   iobox_set_mode(ioport);
 }
 
-void set_property(IOPort * /*ioport*/, const char * /*section*/, const char * /*key*/,
-                  const char * /*value*/) {}
-
-void free_data(IOPort *ioport) {
-  io_port_set_backend_data(ioport, nullptr);
-}
-
-constexpr PortFunctions kFunctions = {
-    .setup = iobox_port_setup,
-    .is_supervisable = is_supervisable,
-    .set_supervised = set_supervised,
-    .get_supervised_ranges = get_supervised_ranges,
-    .set_supervised_ranges = set_supervised_ranges,
-    .get_supervised_readout = get_supervised_readout,
-    .get_state = get_state,
-    .set_state = drive,
-    .start_watch = start_watch,
-    .set_direction = set_direction,
-    .set_property = set_property,
-    .free = free_data,
-};
-
 }  // namespace
 
-SupervisedRangeState iobox_state_to_portd_state(const char *word) {
-  const auto *const found =
-      std::find_if(std::begin(kStateWords), std::end(kStateWords),
-                   [&](const StateWord &entry) { return entry.word == word; });
-  if (found != std::end(kStateWords)) {
-    return found->state;
-  }
-  log_place(G_LOG_LEVEL_WARNING, kBadWord, "Unrecognized iobox supervised state: %s", word);
-  return SUPERVISED_STATE_UNDEFINED;
+IoBoxBackendData::~IoBoxBackendData() {
+  unfollow(this);
 }
 
 void iobox_handle_signal(IOPort *ioport, const char *signal, GVariant *parameters) {
@@ -301,14 +358,22 @@ void iobox_handle_signal(IOPort *ioport, const char *signal, GVariant *parameter
   if (number != io_port_get_number(ioport)) {
     return;
   }
-  IoBoxBackendData *data = data_of(ioport);
-  const std::int32_t state = iobox_state_to_portd_state(word);
-  if (data->state.exchange(state) != state && data->watching) {
-    io_port_report_state(ioport, io_port_get_state(ioport));
+  if (const auto &heard = data_of(ioport)->heard) {
+    ++*heard;
   }
+  take_state(ioport, iobox_state_to_portd_state(word));
 }
 
-const PortFunctions *iobox_backend_functions(IOPort *ioport) {
-  io_port_make_backend_data<IoBoxBackendData>(ioport);
-  return &kFunctions;
-}
+extern constexpr PortFunctions kIoBoxBackend = {
+    .make_record = make_backend_record<IoBoxBackendData>,
+    .setup = iobox_port_setup,
+    .is_supervisable = is_supervisable,
+    .set_supervised = set_supervised,
+    .get_supervised_ranges = get_supervised_ranges,
+    .set_supervised_ranges = set_supervised_ranges,
+    .get_supervised_readout = get_supervised_readout,
+    .get_state = get_state,
+    .set_state = drive,
+    .start_watch = start_watch,
+    .set_direction = set_direction,
+};

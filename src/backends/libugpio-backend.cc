@@ -5,8 +5,8 @@
 
 #include "backends/edge-watch.h"
 #include "backends/libugpio-utils.h"
-#include "backends/tables.h"
 #include "base/log.h"
+#include "port/ioport.h"
 
 namespace {
 
@@ -122,7 +122,7 @@ GpioPinPtr *pin_of_section(GpioBackendData *data, std::string_view section) {
 }
 
 void set_property(IOPort *port, const char *section, const char *key, const char *value) {
-  auto *data = io_port_make_backend_data<GpioBackendData>(port);
+  GpioBackendData *data = data_of(port);
   GpioPinPtr *pin = pin_of_section(data, section);
   if (!pin) {
     log_warning("Could not parse backend data!\n");
@@ -131,23 +131,14 @@ void set_property(IOPort *port, const char *section, const char *key, const char
   libugpio_set_gpio_pin_property(libugpio_make_gpio_pin(*pin), key, value);
 }
 
-void free_data(IOPort *port) {
-  io_port_set_backend_data(port, nullptr);
-}
+}  // namespace
 
-constexpr PortFunctions kFunctions = {
+extern constexpr PortFunctions kGpioBackend = {
+    .make_record = make_backend_record<GpioBackendData>,
     .setup = setup,
     .get_state = get_state,
     .set_state = set_state,
     .start_watch = start_watch,
     .set_direction = set_direction,
     .set_property = set_property,
-    .free = free_data,
 };
-
-}  // namespace
-
-const PortFunctions *gpio_backend_functions(IOPort *port) {
-  io_port_make_backend_data<GpioBackendData>(port);
-  return &kFunctions;
-}

@@ -17,11 +17,6 @@ constexpr unsigned int kOutputLow = UGPIOF_ALTER_DIR;
 constexpr unsigned int kOutputHigh = UGPIOF_ALTER_DIR | UGPIOF_INIT_HIGH;
 static_assert(kInput == 0x14D && kOutputLow == 0x40 && kOutputHigh == 0x42);
 
-// As printf writes an absent text.
-const char *alias_text(const GpioPin *pin) {
-  return pin->alias ? pin->alias->c_str() : "(null)";
-}
-
 unsigned int request_flags(const GpioPin *pin, bool is_input, bool value) {
   if (is_input) {
     return kInput;
@@ -32,6 +27,16 @@ unsigned int request_flags(const GpioPin *pin, bool is_input, bool value) {
 ugpio_t *request_line(const GpioPin *pin, unsigned int flags) {
   return pin->alias ? ugpio_request_one_named(pin->alias->c_str(), flags)
                     : ugpio_request_one(static_cast<unsigned int>(pin->pin), flags, kLabel);
+}
+
+// What failed, with errno; null when nothing did.
+const char *prepare_line(const GpioPin *pin) {
+  if (ugpio_full_open(pin->handle) == -1) {
+    return "Failed to open pin fd!";
+  }
+  return ugpio_set_activelow(pin->handle, pin->inverted != 0 ? 1 : 0) != 0
+             ? "Failed set active low!"
+             : nullptr;
 }
 
 // A library that is not ours may not take a null handle as kindly.
@@ -45,22 +50,25 @@ bool has_handle(const GpioPin *pin) {
 
 }  // namespace
 
-bool libugpio_request_gpio_pin(GpioPin *pin, bool is_input, bool value) {
+const char *libugpio_alias_text(const GpioPin *pin) {
+  return pin->alias ? pin->alias->c_str() : "(null)";
+}
+
+bool libugpio_request_gpio_pin(GpioPin *pin, bool is_input, bool value, GLogLevelFlags level) {
   libugpio_close_gpio_pin(pin);
   pin->handle = request_line(pin, request_flags(pin, is_input, value));
-  if (!pin->handle) {
-    log_warning("Failed to allocate pin %d/%s", pin->pin, alias_text(pin));
-    return false;
+  const char *failure = pin->handle ? prepare_line(pin) : "Failed to allocate pin";
+  if (!failure) {
+    return true;
   }
-  if (ugpio_full_open(pin->handle) == -1) {
-    log_warning("Failed to open pin fd!");
-    return false;
+  const int reason = errno;
+  if (pin->handle) {
+    log_at(level, "%s", failure);
+  } else {
+    log_at(level, "%s %d/%s", failure, pin->pin, libugpio_alias_text(pin));
   }
-  if (ugpio_set_activelow(pin->handle, pin->inverted != 0 ? 1 : 0) != 0) {
-    log_warning("Failed set active low!");
-    return false;
-  }
-  return true;
+  errno = reason;
+  return false;
 }
 
 int libugpio_get_gpio_pin(const GpioPin *pin) {
@@ -77,7 +85,7 @@ bool libugpio_set_gpio_pin(const GpioPin *pin, int value) {
   if (libugpio_write_gpio_pin(pin, value) != -1) {
     return true;
   }
-  log_warning("Failed to set gpio pin %s: %s", alias_text(pin), g_strerror(errno));
+  log_warning("Failed to set gpio pin %s: %s", libugpio_alias_text(pin), g_strerror(errno));
   return false;
 }
 

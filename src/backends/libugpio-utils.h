@@ -4,6 +4,7 @@
 // A pin without a handle can be used like any other: its reads and writes fail.
 #pragma once
 
+#include <glib.h>
 #include <ugpio/ugpio.h>
 
 #include <cstdint>
@@ -21,8 +22,12 @@ struct GpioPin {
 
 // Requests and opens the line and sets its active-low sense; what an earlier request left is given
 // back first. An output starts at the logical level `value` without a glitch. False: it failed, and
-// the log says at what. A line that was had but could not be prepared keeps its handle.
-bool libugpio_request_gpio_pin(GpioPin *pin, bool is_input, bool value);
+// the log says at what, at that level, and errno why. A line that was had but could not be prepared
+// keeps its handle.
+bool libugpio_request_gpio_pin(GpioPin *pin, bool is_input, bool value,
+                               GLogLevelFlags level = G_LOG_LEVEL_WARNING);
+// The pin's alias for a message, as printf writes an absent text.
+const char *libugpio_alias_text(const GpioPin *pin);
 // The logical level, or -1 with errno. No pin reads like one without a handle. Acknowledges an
 // edge.
 int libugpio_get_gpio_pin(const GpioPin *pin);

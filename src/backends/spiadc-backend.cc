@@ -9,11 +9,12 @@
 #include <string_view>
 #include <vector>
 
+#include "backends/poll-interval.h"
 #include "backends/spi-sample.h"
-#include "backends/tables.h"
 #include "base/log.h"
 #include "base/source.h"
 #include "base/unique-fd.h"
+#include "port/ioport.h"
 
 namespace {
 
@@ -59,8 +60,6 @@ std::uint32_t get_state(IOPort *port) {
   return data_of(port)->state > 0 ? 1 : 0;
 }
 
-void set_state(IOPort * /*port*/, std::int32_t /*level*/) {}
-
 // In 64 bits, where no limit that a document gives can overflow.
 bool in_range(const SpiAdcRange &range, std::int64_t sample, bool was_in_range) {
   const std::int64_t widening =
@@ -96,12 +95,12 @@ gboolean take_sample(gpointer user_data) {
 }
 
 void start_watch(IOPort *port) {
-  if (SpiAdcBackendData *data = data_of(port)) {
-    data->source = Source(g_timeout_add(data->timeout, take_sample, port));
+  SpiAdcBackendData *data = data_of(port);
+  // A timer that runs goes on: arming it anew would put its next sample off.
+  if (data && !data->source) {
+    data->source = Source(g_timeout_add(poll_interval(port, data->timeout), take_sample, port));
   }
 }
-
-void set_direction(IOPort * /*port*/, bool /*input*/) {}
 
 std::int32_t parse_number(const char *text) {
   return static_cast<std::int32_t>(g_ascii_strtoll(text, nullptr, 0));
@@ -136,7 +135,7 @@ void set_range_property(SpiAdcBackendData *data, std::string_view key, const cha
 
 // A "range" section begins a range, whatever it says; the "input" section after it fills the range.
 void set_property(IOPort *port, const char *section, const char *key, const char *value) {
-  auto *data = io_port_make_backend_data<SpiAdcBackendData>(port);
+  SpiAdcBackendData *data = data_of(port);
   const std::string_view name = section;
   if (name == "device") {
     set_device_property(data, key, value);
@@ -149,23 +148,12 @@ void set_property(IOPort *port, const char *section, const char *key, const char
   }
 }
 
-void free_data(IOPort *port) {
-  io_port_set_backend_data(port, nullptr);
-}
-
-constexpr PortFunctions kFunctions = {
-    .setup = setup,
-    .get_state = get_state,
-    .set_state = set_state,
-    .start_watch = start_watch,
-    .set_direction = set_direction,
-    .set_property = set_property,
-    .free = free_data,
-};
-
 }  // namespace
 
-const PortFunctions *spiadc_backend_functions(IOPort *port) {
-  io_port_make_backend_data<SpiAdcBackendData>(port);
-  return &kFunctions;
-}
+extern constexpr PortFunctions kSpiAdcBackend = {
+    .make_record = make_backend_record<SpiAdcBackendData>,
+    .setup = setup,
+    .get_state = get_state,
+    .start_watch = start_watch,
+    .set_property = set_property,
+};

@@ -11,10 +11,11 @@
 #include <string>
 #include <string_view>
 
-#include "backends/tables.h"
+#include "backends/poll-interval.h"
 #include "base/log.h"
 #include "base/source.h"
 #include "base/unique-fd.h"
+#include "port/ioport.h"
 
 namespace {
 
@@ -54,8 +55,6 @@ bool setup(IOPort *port, bool /*initial_level*/) {
 std::uint32_t get_state(IOPort *ioport) {
   return data_of(ioport)->state != 0 ? 1 : 0;
 }
-
-void set_state(IOPort * /*ioport*/, std::int32_t /*level*/) {}
 
 void seek_to_start(const SysfsBackendData *data) {
   (void)lseek(data->fd.get(), 0, SEEK_SET);
@@ -125,13 +124,14 @@ gboolean poll_file(gpointer user_data) {
 
 void start_watch(IOPort *port) {
   SysfsBackendData *data = data_of(port);
-  data->source = Source(g_timeout_add(data->timeout, poll_file, port));
+  // A timer that runs goes on: arming it anew would put its next look off.
+  if (!data->source) {
+    data->source = Source(g_timeout_add(poll_interval(port, data->timeout), poll_file, port));
+  }
 }
 
-void set_direction(IOPort * /*ioport*/, bool /*input*/) {}
-
 void set_property(IOPort *port, const char *section, const char *key, const char *value) {
-  auto *data = io_port_make_backend_data<SysfsBackendData>(port);
+  SysfsBackendData *data = data_of(port);
   const std::string_view name = key;
   if (std::string_view(section) != "device") {
     log_warning("Could not parse backend data!\n");
@@ -146,23 +146,12 @@ void set_property(IOPort *port, const char *section, const char *key, const char
   }
 }
 
-void free_data(IOPort *port) {
-  io_port_set_backend_data(port, nullptr);
-}
-
-constexpr PortFunctions kFunctions = {
-    .setup = setup,
-    .get_state = get_state,
-    .set_state = set_state,
-    .start_watch = start_watch,
-    .set_direction = set_direction,
-    .set_property = set_property,
-    .free = free_data,
-};
-
 }  // namespace
 
-const PortFunctions *sysfs_backend_functions(IOPort *port) {
-  io_port_make_backend_data<SysfsBackendData>(port);
-  return &kFunctions;
-}
+extern constexpr PortFunctions kSysfsBackend = {
+    .make_record = make_backend_record<SysfsBackendData>,
+    .setup = setup,
+    .get_state = get_state,
+    .start_watch = start_watch,
+    .set_property = set_property,
+};

@@ -6,19 +6,17 @@
 
 #include <cstdio>
 
-namespace {
-constexpr const char *kAccount = "pcd";
-}
+#include "base/service-account.h"
 
 void drop_privileges() {
-  const passwd *user = getpwnam(kAccount);
+  const passwd *user = getpwnam(kServiceAccount);
   if (!user) {
-    std::fprintf(stderr, "Couldn't get uid for user \"%s\".\n", kAccount);
+    std::fprintf(stderr, "Couldn't get uid for user \"%s\".\n", kServiceAccount);
     return;
   }
-  const group *account_group = getgrnam(kAccount);
+  const group *account_group = getgrnam(kServiceAccount);
   if (!account_group) {
-    std::fprintf(stderr, "Couldn't get gid for group \"%s\".\n", kAccount);
+    std::fprintf(stderr, "Couldn't get gid for group \"%s\".\n", kServiceAccount);
     return;
   }
   const gid_t gid = account_group->gr_gid;
@@ -26,9 +24,9 @@ void drop_privileges() {
     std::fprintf(stderr, "Failed setting gid to %d: %m\n", static_cast<int>(gid));
     return;
   }
-  if (initgroups(kAccount, gid) != 0) {
-    std::fprintf(stderr, "Unable to run initgroups() with username: %s, gid: %d: %m\n", kAccount,
-                 static_cast<int>(gid));
+  if (initgroups(kServiceAccount, gid) != 0) {
+    std::fprintf(stderr, "Unable to run initgroups() with username: %s, gid: %d: %m\n",
+                 kServiceAccount, static_cast<int>(gid));
     return;
   }
   if (setuid(user->pw_uid) != 0) {

@@ -3,17 +3,14 @@
 #include <functional>
 #include <vector>
 
-#include "base/glib-ptr.h"
-#include "base/own-name.h"
+#include "dbus/bus-service.h"
 #include "pcd-connector-gen.h"
 #include "port/ioport.h"
 #include "port/port-registry.h"
 
 namespace {
 
-constexpr const char *kPath = "/com/kelv/PCD/Connector";
-
-GObjectPtr<PCDConnector> skeleton;
+BusService service("com.kelv.PCD.Connector", "/com/kelv/PCD/Connector");
 
 struct Selection {
   bool video;
@@ -59,18 +56,13 @@ gboolean get_connector_states(PCDConnector *object, GDBusMethodInvocation *invoc
 
 }  // namespace
 
-void connector_export(GDBusConnection *connection) {
-  skeleton.reset(pcd_connector_skeleton_new());
-  g_signal_connect(skeleton.get(), "handle-get-num-connectors", G_CALLBACK(get_num_connectors),
-                   nullptr);
-  g_signal_connect(skeleton.get(), "handle-get-connector-states", G_CALLBACK(get_connector_states),
-                   nullptr);
-  export_object(G_DBUS_INTERFACE_SKELETON(skeleton.get()), connection, kPath);
+void connector_start() {
+  PCDConnector *object = pcd_connector_skeleton_new();
+  connect_handlers(object, {{"handle-get-num-connectors", G_CALLBACK(get_num_connectors)},
+                            {"handle-get-connector-states", G_CALLBACK(get_connector_states)}});
+  service.start(G_DBUS_INTERFACE_SKELETON(object));
 }
 
-void connector_withdraw() {
-  if (skeleton) {
-    g_dbus_interface_skeleton_unexport(G_DBUS_INTERFACE_SKELETON(skeleton.get()));
-    skeleton.reset();
-  }
+void connector_stop() {
+  service.stop();
 }

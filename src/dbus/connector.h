@@ -1,10 +1,7 @@
-// The connector interface: which of the ports that sense a connector are plugged in.
+// The connector interface: which of the ports that sense a connector are plugged in. Main thread.
 #pragma once
 
-#include <gio/gio.h>
-
-inline constexpr const char *kConnectorName = "com.kelv.PCD.Connector";
-
-// Exports the object on the connection of the control interface. Main thread.
-void connector_export(GDBusConnection *connection);
-void connector_withdraw();
+// Serves the interface under its bus name as soon as there is a bus.
+void connector_start();
+// Withdraws the object and gives the name up.
+void connector_stop();

@@ -1,8 +1,11 @@
 #include "dbus/iocontrol-handlers.h"
 
+#include <memory>
 #include <optional>
 
-#include "dbus/reannounce.h"
+#include "dbus/bus-service.h"
+#include "dbus/with-port.h"
+#include "legacy/bridge.h"
 #include "port/ioport.h"
 #include "port/port-error.h"
 #include "port/port-registry.h"
@@ -11,169 +14,152 @@
 
 namespace {
 
-gboolean fail(GDBusMethodInvocation *invocation, IOControlError code, const char *message) {
+void fail(GDBusMethodInvocation *invocation, IOControlError code, const char *message) {
   g_dbus_method_invocation_return_error_literal(invocation, io_control_error_quark(), code,
                                                 message);
-  return TRUE;
 }
 
-gboolean fail_no_port(GDBusMethodInvocation *invocation) {
-  return fail(invocation, IO_CONTROL_ERROR_NO_PORT, "No such port.");
+// One of the device's own ports.
+template <typename Serve>
+gboolean with_port(GDBusMethodInvocation *invocation, guint number, Serve serve) {
+  return serve_port(invocation, io_control_error_quark(), find_ioport(number), serve);
 }
 
-// The port of the device that a client means by the number, or none.
-IOPortRef find_ioport(guint number) {
-  IOPortRef ioport = port_registry_find(number);
-  return io_port_is_ioport(ioport.get()) ? std::move(ioport) : nullptr;
+// A port that is only virtual too: the registry finds no others.
+template <typename Serve>
+gboolean with_any_port(GDBusMethodInvocation *invocation, guint number, Serve serve) {
+  return serve_port(invocation, io_control_error_quark(), port_registry_find(number), serve);
 }
 
-void save(const IOPortRef &ioport) {
-  param_save_for_port(ioport.get(), kSettingsFile);
+void save(IOPort *ioport) {
+  param_request_save(ioport, kSettingsFile);
+}
+
+// Answers, and then stores the settings, once whatever the port waits for has answered: this caller
+// waits, nobody else does.
+template <typename Answer>
+void answer_and_save(IOPort *ioport, Answer answer) {
+  io_port_ref(ioport);
+  const std::shared_ptr<IOPort> port(ioport, io_port_unref);
+  io_port_when_settled(ioport, [port, answer] {
+    answer();
+    save(port.get());
+  });
 }
 
 gboolean get_state(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                    gpointer /*user_data*/) {
-  const IOPortRef ioport = find_ioport(number);
-  if (!ioport) {
-    return fail_no_port(invocation);
-  }
-  iocontrol_state_complete_get_state(object, invocation, io_port_get_state(ioport.get()));
-  return TRUE;
+  return with_port(invocation, number, [&](IOPort *ioport) {
+    iocontrol_state_complete_get_state(object, invocation, io_port_get_state(ioport));
+  });
 }
 
 gboolean set_state(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                    gboolean active, gpointer /*user_data*/) {
-  const IOPortRef ioport = find_ioport(number);
-  if (!ioport) {
-    return fail_no_port(invocation);
-  }
-  if (!io_port_set_state(ioport.get(), active)) {
-    return fail(invocation, IO_CONTROL_ERROR_NOT_OUTPUT, "Port not output.");
-  }
-  iocontrol_state_complete_set_state(object, invocation);
-  save(ioport);
-  return TRUE;
+  return with_port(invocation, number, [&](IOPort *ioport) {
+    if (!io_port_set_state(ioport, active)) {
+      return fail(invocation, IO_CONTROL_ERROR_NOT_OUTPUT, "Port not output.");
+    }
+    answer_and_save(ioport, [=] { iocontrol_state_complete_set_state(object, invocation); });
+  });
 }
 
 gboolean is_configurable(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                          gpointer /*user_data*/) {
-  const IOPortRef ioport = find_ioport(number);
-  if (!ioport) {
-    return fail_no_port(invocation);
-  }
-  iocontrol_state_complete_is_configurable(object, invocation,
-                                           io_port_get_type(ioport.get()) == PORT_CONFIGURABLE);
-  return TRUE;
+  return with_port(invocation, number, [&](IOPort *ioport) {
+    iocontrol_state_complete_is_configurable(object, invocation,
+                                             io_port_get_type(ioport) == PORT_CONFIGURABLE);
+  });
 }
 
 gboolean get_direction(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                        gpointer /*user_data*/) {
-  const IOPortRef ioport = find_ioport(number);
-  if (!ioport) {
-    return fail_no_port(invocation);
-  }
-  iocontrol_state_complete_get_direction(object, invocation,
-                                         direction_word(io_port_input(ioport.get())));
-  return TRUE;
+  return with_port(invocation, number, [&](IOPort *ioport) {
+    iocontrol_state_complete_get_direction(object, invocation,
+                                           direction_word(io_port_input(ioport)));
+  });
 }
 
-// Stores the settings whatever the outcome, as clients have come to rely on.
+// Stores the settings after a refusal too.
 gboolean set_direction(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                        const char *direction, gpointer /*user_data*/) {
-  const IOPortRef ioport = find_ioport(number);
-  if (!ioport) {
-    return fail_no_port(invocation);
-  }
-  const auto input = parse_direction(direction);
-  if (!input) {
-    fail(invocation, IO_CONTROL_ERROR_GENERIC,
-         "Incorrect input to set_direction eiter use 'input' or 'output'");
-  } else if (io_port_set_direction(ioport.get(), *input)) {
-    iocontrol_state_complete_set_direction(object, invocation);
-  } else {
-    fail(invocation, IO_CONTROL_ERROR_NOT_CONFIGURABLE, "Port not configurable.");
-  }
-  save(ioport);
-  return TRUE;
+  return with_port(invocation, number, [&](IOPort *ioport) {
+    const auto input = parse_direction(direction);
+    if (!input) {
+      fail(invocation, IO_CONTROL_ERROR_GENERIC,
+           "Incorrect input to set_direction eiter use 'input' or 'output'");
+    } else if (io_port_set_direction(ioport, *input)) {
+      return answer_and_save(ioport,
+                             [=] { iocontrol_state_complete_set_direction(object, invocation); });
+    } else {
+      fail(invocation, IO_CONTROL_ERROR_NOT_CONFIGURABLE, "Port not configurable.");
+    }
+    save(ioport);
+  });
 }
 
 gboolean get_active(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                     gpointer /*user_data*/) {
-  const IOPortRef ioport = find_ioport(number);
-  if (!ioport) {
-    return fail_no_port(invocation);
-  }
-  iocontrol_state_complete_get_active(object, invocation,
-                                      activelow_word(io_port_get_activelow(ioport.get(), true)),
-                                      activelow_word(io_port_get_activelow(ioport.get(), false)));
-  return TRUE;
+  return with_port(invocation, number, [&](IOPort *ioport) {
+    iocontrol_state_complete_get_active(object, invocation,
+                                        activelow_word(io_port_get_activelow(ioport, true)),
+                                        activelow_word(io_port_get_activelow(ioport, false)));
+  });
 }
 
-// Stores the settings whatever the outcome, as clients have come to rely on.
+// Stores the settings after a refusal too.
 gboolean set_active(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                     gboolean input, const char *state, gpointer /*user_data*/) {
-  const IOPortRef ioport = find_ioport(number);
-  if (!ioport) {
-    return fail_no_port(invocation);
-  }
-  const auto activelow = parse_activelow(state);
-  if (!activelow) {
-    fail(invocation, IO_CONTROL_ERROR_GENERIC,
-         "Incorrect input to set_active eiter use 'open' or 'closed'");
-  } else if (io_port_set_activelow(ioport.get(), *activelow, input)) {
-    iocontrol_state_complete_set_active(object, invocation);
-  } else {
-    fail(invocation, IO_CONTROL_ERROR_GENERIC,
-         *activelow ? "Could not set port to open." : "Could not set port to closed.");
-  }
-  save(ioport);
-  return TRUE;
+  return with_port(invocation, number, [&](IOPort *ioport) {
+    const auto activelow = parse_activelow(state);
+    if (!activelow) {
+      fail(invocation, IO_CONTROL_ERROR_GENERIC,
+           "Incorrect input to set_active eiter use 'open' or 'closed'");
+    } else if (io_port_set_activelow(ioport, *activelow, input)) {
+      return answer_and_save(ioport,
+                             [=] { iocontrol_state_complete_set_active(object, invocation); });
+    } else {
+      fail(invocation, IO_CONTROL_ERROR_GENERIC,
+           *activelow ? "Could not set port to open." : "Could not set port to closed.");
+    }
+    save(ioport);
+  });
 }
 
 gboolean get_names(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                    gpointer /*user_data*/) {
-  const IOPortRef ioport = find_ioport(number);
-  if (!ioport) {
-    return fail_no_port(invocation);
-  }
-  std::optional<std::string> input;
-  std::optional<std::string> output;
-  io_port_get_names(ioport.get(), &input, &output);
-  iocontrol_state_complete_get_names(object, invocation, input.value_or("").c_str(),
-                                     output.value_or("").c_str());
-  return TRUE;
+  return with_port(invocation, number, [&](IOPort *ioport) {
+    std::optional<std::string> input;
+    std::optional<std::string> output;
+    io_port_get_names(ioport, &input, &output);
+    iocontrol_state_complete_get_names(object, invocation, input.value_or("").c_str(),
+                                       output.value_or("").c_str());
+  });
 }
 
 gboolean set_name(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                   gboolean input, const char *name, gpointer /*user_data*/) {
-  const IOPortRef ioport = find_ioport(number);
-  if (!ioport) {
-    return fail_no_port(invocation);
-  }
-  const auto set = input ? io_port_set_input_name : io_port_set_output_name;
-  if (!set(ioport.get(), name)) {
-    return fail(invocation, IO_CONTROL_ERROR_GENERIC,
-                input ? "Could not set input name for the port."
-                      : "Could not set output name for the port.");
-  }
-  iocontrol_state_complete_set_name(object, invocation);
-  save(ioport);
-  return TRUE;
+  return with_port(invocation, number, [&](IOPort *ioport) {
+    const auto set = input ? io_port_set_input_name : io_port_set_output_name;
+    if (!set(ioport, name)) {
+      return fail(invocation, IO_CONTROL_ERROR_GENERIC,
+                  input ? "Could not set input name for the port."
+                        : "Could not set output name for the port.");
+    }
+    iocontrol_state_complete_set_name(object, invocation);
+    save(ioport);
+  });
 }
 
-// The one method that serves ports that are only virtual too: lookups find no others.
 gboolean set_virtual(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                      gboolean state, gpointer /*user_data*/) {
-  const IOPortRef ioport = port_registry_find(number);
-  if (!ioport) {
-    return fail_no_port(invocation);
-  }
-  if (!io_port_set_virtual(ioport.get(), state)) {
-    return fail(invocation, IO_CONTROL_ERROR_GENERIC, "Could not set port.");
-  }
-  iocontrol_state_complete_set_virtual(object, invocation);
-  save(ioport);
-  return TRUE;
+  return with_any_port(invocation, number, [&](IOPort *ioport) {
+    if (!io_port_set_virtual(ioport, state)) {
+      return fail(invocation, IO_CONTROL_ERROR_GENERIC, "Could not set port.");
+    }
+    iocontrol_state_complete_set_virtual(object, invocation);
+    save(ioport);
+  });
 }
 
 ActionSequence parse_sequence(bool is_virtual, GVariant *steps) {
@@ -191,22 +177,22 @@ ActionSequence parse_sequence(bool is_virtual, GVariant *steps) {
 gboolean start_action_sequence(IOControlState *object, GDBusMethodInvocation *invocation,
                                guint number, gboolean is_virtual, GVariant *steps,
                                gpointer /*user_data*/) {
-  const IOPortRef ioport = port_registry_find(number);
-  if (!ioport) {
-    return fail_no_port(invocation);
-  }
-  ActionSequence sequence = parse_sequence(is_virtual, steps);
-  if (sequence.steps.empty()) {
-    return fail(invocation, IO_CONTROL_ERROR_GENERIC, "The sequence has no steps.");
-  }
-  if (io_port_is_busy(ioport.get())) {
-    return fail(invocation, IO_CONTROL_ERROR_BUSY, "The port is busy.");
-  }
-  if (!io_port_run_action_sequence(ioport.get(), std::move(sequence))) {
-    return fail(invocation, IO_CONTROL_ERROR_NOT_OUTPUT, "Port not output.");
-  }
-  iocontrol_state_complete_start_action_sequence(object, invocation);
-  return TRUE;
+  return with_any_port(invocation, number, [&](IOPort *ioport) {
+    if (g_variant_n_children(steps) > kMaxSequenceSteps) {
+      return fail(invocation, IO_CONTROL_ERROR_GENERIC, "The sequence has too many steps.");
+    }
+    ActionSequence sequence = parse_sequence(is_virtual, steps);
+    if (sequence.steps.empty()) {
+      return fail(invocation, IO_CONTROL_ERROR_GENERIC, "The sequence has no steps.");
+    }
+    if (io_port_is_busy(ioport)) {
+      return fail(invocation, IO_CONTROL_ERROR_BUSY, "The port is busy.");
+    }
+    if (!io_port_run_action_sequence(ioport, std::move(sequence))) {
+      return fail(invocation, IO_CONTROL_ERROR_NOT_OUTPUT, "Port not output.");
+    }
+    iocontrol_state_complete_start_action_sequence(object, invocation);
+  });
 }
 
 gboolean get_nbr_ports(IOControlState *object, GDBusMethodInvocation *invocation,
@@ -250,6 +236,13 @@ gboolean get_port_props(IOControlState *object, GDBusMethodInvocation *invocatio
   return TRUE;
 }
 
+// Tells the rest of the device that ports have come or gone.
+void reannounce_ports() {
+  legacy_interface_renew();
+  port_registry_arm_watches();
+  port_registry_declare_events();
+}
+
 bool drop_port(const char *id) {
   const IOPortRef ioport = port_registry_get_by_id(id);
   if (!ioport || !io_port_is_optional(ioport.get())) {
@@ -278,39 +271,33 @@ gboolean drop_io_ports(IOControlState *object, GDBusMethodInvocation *invocation
 
 gboolean refresh_io_ports(IOControlState *object, GDBusMethodInvocation *invocation,
                           gpointer /*user_data*/) {
-  if (port_registry_retry_parked() > 0) {
-    reannounce_ports();
-  }
-  iocontrol_state_complete_refresh_ioports(object, invocation);
+  port_registry_retry_parked([=](std::size_t count) {
+    if (count > 0) {
+      reannounce_ports();
+    }
+    iocontrol_state_complete_refresh_ioports(object, invocation);
+  });
   return TRUE;
 }
-
-struct Handler {
-  const char *signal;
-  GCallback callback;
-};
 
 }  // namespace
 
 void iocontrol_connect_handlers(IOControlState *object) {
-  const Handler handlers[] = {
-      {"handle-get-state", G_CALLBACK(get_state)},
-      {"handle-set-state", G_CALLBACK(set_state)},
-      {"handle-is-configurable", G_CALLBACK(is_configurable)},
-      {"handle-get-direction", G_CALLBACK(get_direction)},
-      {"handle-set-direction", G_CALLBACK(set_direction)},
-      {"handle-get-active", G_CALLBACK(get_active)},
-      {"handle-set-active", G_CALLBACK(set_active)},
-      {"handle-get-names", G_CALLBACK(get_names)},
-      {"handle-set-name", G_CALLBACK(set_name)},
-      {"handle-set-virtual", G_CALLBACK(set_virtual)},
-      {"handle-start-action-sequence", G_CALLBACK(start_action_sequence)},
-      {"handle-get-nbr-ports", G_CALLBACK(get_nbr_ports)},
-      {"handle-get-port-props", G_CALLBACK(get_port_props)},
-      {"handle-drop-ioports", G_CALLBACK(drop_io_ports)},
-      {"handle-refresh-ioports", G_CALLBACK(refresh_io_ports)},
-  };
-  for (const auto &handler : handlers) {
-    g_signal_connect(object, handler.signal, handler.callback, nullptr);
-  }
+  connect_handlers(object, {
+                               {"handle-get-state", G_CALLBACK(get_state)},
+                               {"handle-set-state", G_CALLBACK(set_state)},
+                               {"handle-is-configurable", G_CALLBACK(is_configurable)},
+                               {"handle-get-direction", G_CALLBACK(get_direction)},
+                               {"handle-set-direction", G_CALLBACK(set_direction)},
+                               {"handle-get-active", G_CALLBACK(get_active)},
+                               {"handle-set-active", G_CALLBACK(set_active)},
+                               {"handle-get-names", G_CALLBACK(get_names)},
+                               {"handle-set-name", G_CALLBACK(set_name)},
+                               {"handle-set-virtual", G_CALLBACK(set_virtual)},
+                               {"handle-start-action-sequence", G_CALLBACK(start_action_sequence)},
+                               {"handle-get-nbr-ports", G_CALLBACK(get_nbr_ports)},
+                               {"handle-get-port-props", G_CALLBACK(get_port_props)},
+                               {"handle-drop-ioports", G_CALLBACK(drop_io_ports)},
+                               {"handle-refresh-ioports", G_CALLBACK(refresh_io_ports)},
+                           });
 }

@@ -1,5 +1,6 @@
 #include "events/event-values.h"
 
+#include <algorithm>
 #include <optional>
 #include <string_view>
 
@@ -103,16 +104,12 @@ bool populate_nice_names(IOPort *ioport, const IoEventKey &key, Inspectable *ins
   return true;
 }
 
-bool populate_declared_key(IOPort *ioport, const IoEventKey &key, Inspectable *inspectable,
-                           std::string *property_key_out) {
-  if (!populate_nice_names(ioport, key, inspectable)) {
-    return false;
-  }
-  if (key.property) {
-    *property_key_out = key.name.value_or("");
-    return true;
-  }
-  return populate_value(ioport, key, inspectable);
+// Of several keys that are to be the property the last one is. The others are part of the
+// declaration all the same, since they are sent.
+const IoEventKey *property_of(const std::list<IoEventKey> &keys) {
+  const auto found =
+      std::find_if(keys.rbegin(), keys.rend(), [](const IoEventKey &key) { return key.property; });
+  return found == keys.rend() ? nullptr : &*found;
 }
 
 const char *fault_of(const IoEventKey &key) {
@@ -144,15 +141,18 @@ bool event_keys_are_sound(const IOPort *ioport, const std::list<IoEventKey> &key
 
 bool populate_event_values(IOPort *ioport, const std::list<IoEventKey> &keys,
                            Inspectable *inspectable, bool sending, std::string *property_key_out) {
+  const IoEventKey *property = property_of(keys);
   for (const auto &key : keys) {
     g_assert(key_type(key.type) != 0);
     if (sending && !key.property) {
       continue;
     }
-    const bool populated = sending
-                               ? populate_value(ioport, key, inspectable)
-                               : populate_declared_key(ioport, key, inspectable, property_key_out);
-    if (!populated) {
+    if (!sending && !populate_nice_names(ioport, key, inspectable)) {
+      return false;
+    }
+    if (!sending && &key == property) {
+      *property_key_out = key.name.value_or("");
+    } else if (!populate_value(ioport, key, inspectable)) {
       return false;
     }
   }

@@ -2,6 +2,7 @@
 
 #include <atomic>
 
+#include "base/assert.h"
 #include "base/glib-ptr.h"
 #include "base/log.h"
 #include "events/event-values.h"
@@ -316,6 +317,6 @@ bool io_event_send(IOPort *ioport, IoEvent *event, std::int32_t value) {
 }
 
 void io_event_reset_filter(IoEvent *event) {
-  g_assert_nonnull(event);
+  assert_nonnull(event);
   event->filter_reset = true;
 }

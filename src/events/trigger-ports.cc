@@ -62,7 +62,7 @@ IOPortRef manual_trigger_port_new(int channel) {
   io_port_set_number(ioport.get(), port_number(channel));
   io_port_set_id(ioport.get(), port_id(channel));
   io_port_set_events_enabled(ioport.get(), false);
-  io_port_set_backend(ioport.get(), kVirtualBackend);
+  io_port_set_backend(ioport.get(), BACKEND_VIRTUAL);
   io_port_set_flag(ioport.get(), "virtual", "true");
   io_port_events(ioport.get()).push_front(trigger_event(channel));
   io_port_setup(ioport.get());

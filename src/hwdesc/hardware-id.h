@@ -4,9 +4,10 @@
 #include <optional>
 #include <string>
 
-// Asks the service for a parameter of the boot block, and waits for the answer. A service that does
-// not answer holds the caller for 25 seconds, and at later look-ups for 0.1 seconds. None, with a
-// message, when it can't be had. Main thread, at start-up.
+// Asks the service for a parameter of the boot block, and waits for the answer while the main
+// loop's sources are served. A service that does not answer holds the caller for 25 seconds, and at
+// later look-ups for 0.1 seconds. None, with a message, when it can't be had. Main thread, at
+// start-up.
 std::optional<std::string> read_hardware_id(const char *parameter);
 
 // Forgets the service, which a look-up remembers for the next one: it may be another process by

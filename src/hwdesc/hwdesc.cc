@@ -28,9 +28,13 @@ struct Loader {
   bool skip_port = false;                  // until the end tag of the port
   bool in_backend = false;                 // attributes go to the port's backend too
   std::optional<std::string> hardware_id;  // once it could be had
+  bool has_root = false;                   // the outermost element may have any name
 };
 
 std::optional<int> first_virtual_input;
+
+// Something in a document means nothing. What exactly is for a strict reader to tell.
+bool met_oddity = false;
 
 bool is_true(const char *text) {
   return g_ascii_strcasecmp(text, "true") == 0;
@@ -212,17 +216,19 @@ struct Element {
   std::string_view name;
   void (*open)(IOPort *ioport);  // null: nothing is made
   void (*apply)(IOPort *ioport, const Attribute &attribute);
+  std::string_view attributes;  // that mean something, each between blanks; empty: any may
 };
 
 constexpr Element kElements[] = {
-    {"port", nullptr, apply_port},
-    {"port_type", nullptr, apply_port_type},
-    {"properties", nullptr, apply_properties},
-    {"port_no", nullptr, apply_port_no},
-    {"param_default_name", nullptr, apply_param_default_name},
-    {"backend", nullptr, apply_backend},
-    {"event", open_event, apply_event},
-    {"keyvalue", open_keyvalue, apply_keyvalue},
+    {"port", nullptr, apply_port, " hwid name optional "},
+    {"port_type", nullptr, apply_port_type, " type "},
+    {"properties", nullptr, apply_properties, {}},
+    {"port_no", nullptr, apply_port_no, " nbr "},
+    {"param_default_name", nullptr, apply_param_default_name, " input output "},
+    {"backend", nullptr, apply_backend, {}},
+    {"event", open_event, apply_event, " declaration input output supervised_input declare_only "},
+    {"keyvalue", open_keyvalue, apply_keyvalue,
+     " key value type key-nice-name value-nice-name property "},
 };
 
 const Element *find_element(std::string_view name) {
@@ -232,6 +238,11 @@ const Element *find_element(std::string_view name) {
     }
   }
   return nullptr;
+}
+
+bool means_something(const Element &element, const Attribute &attribute) {
+  const std::string word = " " + std::string(attribute.name) + " ";
+  return element.attributes.empty() || element.attributes.find(word) != std::string_view::npos;
 }
 
 void apply_first_virtual_input(const Attributes &attributes) {
@@ -267,6 +278,7 @@ void apply_element(Loader &loader, const char *name, const Element *element,
     }
     if (element) {
       element->apply(ioport.get(), attribute);
+      met_oddity |= !loader.in_backend && !means_something(*element, attribute);
     }
     if (names_backend(element, attribute)) {
       loader.in_backend = true;
@@ -287,6 +299,9 @@ void start_element(GMarkupParseContext * /*context*/, const gchar *name, const g
     attributes.push_back({*names, *values});
   }
   const std::string_view element = name;
+  const bool known = find_element(element) || element == "first_virtual_input";
+  met_oddity |= !known && !loader.in_backend && loader.has_root;
+  loader.has_root = true;
   if (element == "port" && !open_port(loader, attributes)) {
     loader.skip_port = true;
     return;
@@ -313,16 +328,32 @@ void end_element(GMarkupParseContext * /*context*/, const gchar *name, gpointer 
 
 constexpr GMarkupParser kParser = {start_element, end_element, nullptr, nullptr, nullptr};
 
-// Ending the parse finds what is cut off, and what is empty: neither is what the maker of the
-// device wrote, and a port that is missing without a word would be hard to find.
-bool parse(std::string_view text) {
+// What the parser says, without its own note of the place.
+std::string reason_of(const Error &error) {
+  const std::string_view message = error.message();
+  const auto place_end = message.starts_with("Error on line ") ? message.find(": ") : message.npos;
+  return std::string(place_end == message.npos ? message : message.substr(place_end + 2));
+}
+
+// Ending the parse finds what is cut off: a port that is missing without a word would be hard to
+// find. A file without anything in it just says nothing.
+bool parse(const std::string &path, std::string_view text) {
   Loader loader;
   const GMarkupContextPtr context(
       g_markup_parse_context_new(&kParser, static_cast<GMarkupParseFlags>(0), &loader, nullptr));
   Error error;
-  return g_markup_parse_context_parse(context.get(), text.data(), static_cast<gssize>(text.size()),
-                                      error.out()) &&
-         g_markup_parse_context_end_parse(context.get(), error.out());
+  const bool whole = g_markup_parse_context_parse(context.get(), text.data(),
+                                                  static_cast<gssize>(text.size()), error.out()) &&
+                     g_markup_parse_context_end_parse(context.get(), error.out());
+  if (whole || error.matches(G_MARKUP_ERROR, G_MARKUP_ERROR_EMPTY)) {
+    return true;
+  }
+  int line = 0;
+  int column = 0;
+  g_markup_parse_context_get_position(context.get(), &line, &column);
+  log_critical("Couldn't parse markup file (%s)\n", path.c_str());
+  log_warning("%s:%d:%d: %s", path.c_str(), line, column, reason_of(error).c_str());
+  return false;
 }
 
 }  // namespace
@@ -337,11 +368,9 @@ bool hwdesc_load_file(const std::string &path) {
     return false;
   }
   const GCharPtr text(contents);
-  if (!parse({contents, length})) {
-    log_critical("Couldn't parse markup file (%s)\n", path.c_str());
-    return false;
-  }
-  return true;
+  const bool parsed = parse(path, {contents, length});
+  met_oddity |= !parsed;
+  return parsed;
 }
 
 void hwdesc_load_directory(const std::string &path) {
@@ -360,6 +389,9 @@ void hwdesc_load_directory(const std::string &path) {
 }
 
 void hwdesc_finish() {
+  if (met_oddity) {
+    log_warning("Some of the hardware description means nothing: \"portctl check\" tells what");
+  }
   release_hardware_id_service();
 }
 

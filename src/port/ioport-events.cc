@@ -56,7 +56,7 @@ void io_port_undeclare_events(IOPort *ioport) {
   }
 }
 
-void io_port_redeclare_events(IOPort *ioport) {
+void io_port_redeclare_events_locked(IOPort *ioport) {
   const auto redeclare = port_listener().redeclare_event;
   if (!ioport->events_enabled || !redeclare) {
     return;
@@ -66,29 +66,47 @@ void io_port_redeclare_events(IOPort *ioport) {
   }
 }
 
-void io_port_declare_events_for_role(IOPort *ioport) {
+// In between, the event of a step would be sent to nobody.
+void io_port_redeclare_events(IOPort *ioport) {
+  const std::lock_guard lock(ioport->lock);
+  io_port_redeclare_events_locked(ioport);
+}
+
+void io_port_declare_events_for_role(IOPort *ioport, bool role_changed) {
   const auto &listener = port_listener();
   if (!ioport->events_enabled) {
     return;
   }
   for (auto &event : ioport->events) {
-    const bool applies = io_port_event_applies(ioport, event);
-    if (applies && listener.declare_event) {
+    if (!io_port_event_applies(ioport, event)) {
+      if (listener.undeclare_event) {
+        listener.undeclare_event(&event);
+      }
+      continue;
+    }
+    // An event of both roles names the port as the role does.
+    if (role_changed && listener.redeclare_event) {
+      listener.redeclare_event(ioport, &event);
+    }
+    if (listener.declare_event) {
       listener.declare_event(ioport, &event);
-    } else if (!applies && listener.undeclare_event) {
-      listener.undeclare_event(&event);
     }
   }
 }
 
 void io_port_fire_events(IOPort *ioport, std::int32_t state) {
+  io_port_fire_line_events(ioport, state, state);
+}
+
+void io_port_fire_line_events(IOPort *ioport, std::int32_t state, std::int32_t line) {
   const auto send = port_listener().send_event;
   if (!ioport->events_enabled || !send) {
     return;
   }
   for (auto &event : ioport->events) {
     if (io_port_event_applies(ioport, event)) {
-      send(ioport, &event, state);
+      const bool of_line = event.supervised_input && io_port_supervised_input(ioport);
+      send(ioport, &event, of_line ? line : state);
     }
   }
 }

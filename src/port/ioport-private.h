@@ -2,6 +2,8 @@
 #pragma once
 
 #include <atomic>
+#include <cstdint>
+#include <functional>
 #include <map>
 #include <mutex>
 #include <optional>
@@ -9,6 +11,7 @@
 #include <vector>
 
 #include "base/condition.h"
+#include "base/glib-ptr.h"
 #include "port/ioport.h"
 
 // One attribute of the backend's part of the hardware description.
@@ -18,9 +21,23 @@ struct BackendProperty {
   std::string value;
 };
 
+// What goes on for the port in the background (port-work.h), counted.
+struct BackgroundWork {
+  struct Waiting {
+    std::uint64_t until;  // how many must have ended
+    std::function<void()> settled;
+  };
+
+  std::mutex lock;  // for the rest; nothing else is locked while it is held
+  MonotonicCondition changed;
+  std::uint64_t begun = 0;
+  std::uint64_t ended = 0;
+  std::vector<Waiting> waiting;  // in the order of `until`
+};
+
 struct IOPort {
   PortType type = PORT_INPUT;
-  int backend = 0;
+  BackendKind backend = BACKEND_VIRTUAL;
   const PortFunctions *functions = nullptr;
   std::unique_ptr<PortBackendData> backend_data;
   // Kept so that a port that was dropped can be brought back with what the document said of it.
@@ -59,12 +76,15 @@ struct IOPort {
   // thread holds it for each step, not between them.
   std::mutex lock;
 
-  // Guards the two flags below. Taken before `lock`, never while `lock` is held.
+  BackgroundWork background;
+
+  // Guards what follows. Taken before `lock`, never while `lock` is held.
   std::mutex sequence_lock;
-  MonotonicCondition sequence_cond;       // a running sequence is asked to end
-  MonotonicCondition sequence_done_cond;  // a running sequence has ended
-  bool cancel_sequence = false;
+  MonotonicCondition sequence_cond;           // a running sequence is asked to end
+  MonotonicCondition sequence_done_cond;      // a running sequence has ended
+  std::atomic<bool> cancel_sequence = false;  // also read by an action thread that waits for a box
   bool sequence_running = false;
+  GObjectPtr<GCancellable> sequence_cancelled;  // of the last sequence, for what waits elsewhere
 
   std::atomic<int> refcount = 1;
 };
@@ -73,16 +93,31 @@ struct IOPort {
 // the port until the lock is given up.
 [[nodiscard]] std::unique_lock<std::mutex> io_port_stop_sequence_and_lock(IOPort *ioport);
 
+// Waits until what was begun in the background for the port so far has ended. False: the port's
+// sequence was cancelled meanwhile. Action threads, without any lock.
+bool io_port_settle_or_cancel(IOPort *ioport);
+// Wakes who waits there, once `cancel_sequence` is set.
+void io_port_cancel_wait(IOPort *ioport);
+
 // Whether the backend can be asked: not while it has given up its record.
 inline bool io_port_backend_serves(const IOPort *ioport) {
   return ioport->functions && !ioport->backend_released;
 }
+
+// The raw level that the backend reads, and the one that it is to write.
+std::uint32_t io_port_read_level(IOPort *ioport);
+void io_port_write_level(IOPort *ioport, std::int32_t level);
 
 // Frees the port, whoever may still hold references.
 void io_port_destroy(IOPort *ioport);
 
 // Sends those events of the port that apply to its role, while its events are enabled.
 void io_port_fire_events(IOPort *ioport, std::int32_t state);
+// The same where the state of the line is known apart: events for supervised inputs are told that.
+void io_port_fire_line_events(IOPort *ioport, std::int32_t state, std::int32_t line);
 void io_port_undeclare_events(IOPort *ioport);
-// Declares the events that apply to the port's role and withdraws the others.
-void io_port_declare_events_for_role(IOPort *ioport);
+// As io_port_redeclare_events. The caller holds the port's lock.
+void io_port_redeclare_events_locked(IOPort *ioport);
+// Declares the events that apply to the port's role, anew when it has changed, and withdraws the
+// others.
+void io_port_declare_events_for_role(IOPort *ioport, bool role_changed);

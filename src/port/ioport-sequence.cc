@@ -3,6 +3,10 @@
 // A sequence counts as running from before its thread starts until after its end was announced, so
 // that there is no moment at which a cancel could be lost. The thread gives up the port's lock for
 // each wait and waits on the sequence lock, under which a cancel is asked for: no wake-up is lost.
+#include <malloc.h>
+
+#include <algorithm>
+
 #include "base/glib-ptr.h"
 #include "base/log.h"
 #include "port/ioport-private.h"
@@ -12,8 +16,15 @@ namespace {
 
 constexpr const char *kThreadName = "Action thread";
 
+// After so many steps the thread waits until those who are told of them have kept up, so that
+// neither their memory nor the answers to others suffer from a sequence without pauses.
+constexpr int kStepsAhead = 64;
+// How late that may make a step: an output must not be held on for long by a bus that hangs.
+constexpr std::int64_t kLongestDelay = 1'000'000;  // microseconds
+
 struct ActionJob {
   IOPortRef port;
+  GObjectPtr<GCancellable> cancelled;
   ActionSequence sequence;
 };
 
@@ -34,18 +45,21 @@ void thread_ends() {
 }
 
 bool can_run(const IOPort *ioport, const ActionSequence &sequence) {
-  const bool may_drive = !io_port_input(ioport) && ioport->backend != kVirtualBackend;
+  const bool may_drive = !io_port_input(ioport) && ioport->backend != BACKEND_VIRTUAL;
   return !sequence.steps.empty() && (sequence.is_virtual || may_drive) && ioport->set_up;
 }
 
-bool claim(IOPort *ioport) {
+// What ends the waits of the sequence that may begin now. Null: one runs already.
+GObjectPtr<GCancellable> claim(IOPort *ioport) {
   const std::lock_guard lock(ioport->sequence_lock);
   if (ioport->sequence_running) {
-    return false;
+    return nullptr;
   }
   ioport->sequence_running = true;
   ioport->cancel_sequence = false;
-  return true;
+  ioport->sequence_cancelled.reset(g_cancellable_new());
+  return GObjectPtr<GCancellable>(
+      static_cast<GCancellable *>(g_object_ref(ioport->sequence_cancelled.get())));
 }
 
 // The product wraps in 32 bits: times above 2,147,483 ms have always behaved that way.
@@ -54,9 +68,8 @@ std::int64_t deadline_after(std::int32_t time_ms) {
   return g_get_monotonic_time() + wrapped;
 }
 
-// Holds the step's state for its time. False: the sequence is cancelled.
-bool hold(IOPort *ioport, std::int32_t time_ms) {
-  const std::int64_t deadline = deadline_after(time_ms);
+// Holds the step's state until then. False: the sequence is cancelled.
+bool hold(IOPort *ioport, std::int64_t deadline) {
   std::unique_lock lock(ioport->sequence_lock);
   while (!ioport->cancel_sequence && g_get_monotonic_time() < deadline) {
     ioport->sequence_cond.wait_until(lock, deadline);
@@ -86,29 +99,64 @@ void announce_end(IOPort *ioport) {
   }
 }
 
-void run_steps(IOPort *ioport, const ActionSequence &sequence) {
-  for (const auto &step : sequence.steps) {
-    take_step(ioport, sequence.is_virtual, step.state);
-    if (!hold(ioport, step.time_ms)) {
+void wait_until_sent(GCancellable *cancelled, std::int64_t step_deadline) {
+  if (const auto wait = port_listener().wait_until_sent) {
+    wait(cancelled, std::max(step_deadline, g_get_monotonic_time() + kLongestDelay));
+  }
+}
+
+void run_steps(const ActionJob &job) {
+  IOPort *ioport = job.port.get();
+  int steps_ahead = 0;
+  for (const auto &step : job.sequence.steps) {
+    take_step(ioport, job.sequence.is_virtual, step.state);
+    // A step's time begins when the port has the state. That is waited for without the lock, so
+    // that nobody else waits along.
+    if (!io_port_settle_or_cancel(ioport)) {
+      return;
+    }
+    const std::int64_t deadline = deadline_after(step.time_ms);
+    if (++steps_ahead == kStepsAhead) {
+      wait_until_sent(job.cancelled.get(), deadline);
+      steps_ahead = 0;
+    }
+    if (!hold(ioport, deadline)) {
       return;
     }
   }
 }
 
+// The message that asked for a long sequence, and its steps, leave a hole in every heap that the
+// allocator would keep.
+void give_memory_back(std::size_t steps) {
+#ifdef __GLIBC__
+  constexpr std::size_t many = 1024;
+  if (steps > many) {
+    malloc_trim(0);
+  }
+#else
+  (void)steps;
+#endif
+}
+
 gpointer run_sequence(gpointer data) {
+  std::size_t steps = 0;
   {
     const std::unique_ptr<ActionJob> job(static_cast<ActionJob *>(data));
-    run_steps(job->port.get(), job->sequence);
+    steps = job->sequence.steps.size();
+    run_steps(*job);
     announce_end(job->port.get());
     release(job->port.get());
   }
+  give_memory_back(steps);
   thread_ends();
   return nullptr;
 }
 
-bool start_thread(IOPort *ioport, ActionSequence sequence) {
+bool start_thread(IOPort *ioport, GObjectPtr<GCancellable> cancelled, ActionSequence sequence) {
   io_port_ref(ioport);
-  auto job = std::make_unique<ActionJob>(ActionJob{IOPortRef(ioport), std::move(sequence)});
+  auto job = std::make_unique<ActionJob>(
+      ActionJob{IOPortRef(ioport), std::move(cancelled), std::move(sequence)});
   thread_begins();
   Error error;
   GThread *thread = g_thread_try_new(kThreadName, run_sequence, job.get(), error.out());
@@ -127,11 +175,12 @@ bool start_thread(IOPort *ioport, ActionSequence sequence) {
 
 bool io_port_run_action_sequence(IOPort *ioport, ActionSequence sequence) {
   g_assert(ioport);
-  if (!can_run(ioport, sequence) || !claim(ioport)) {
+  auto cancelled = can_run(ioport, sequence) ? claim(ioport) : nullptr;
+  if (!cancelled) {
     log_warning("Set action seq on incorrect port");
     return false;
   }
-  return start_thread(ioport, std::move(sequence));
+  return start_thread(ioport, std::move(cancelled), std::move(sequence));
 }
 
 bool io_port_is_busy(IOPort *ioport) {
@@ -151,6 +200,8 @@ std::unique_lock<std::mutex> io_port_stop_sequence_and_lock(IOPort *ioport) {
     // Asked for anew at each wake-up: another sequence may have begun since the last one ended.
     ioport->cancel_sequence = true;
     ioport->sequence_cond.notify_all();
+    g_cancellable_cancel(ioport->sequence_cancelled.get());
+    io_port_cancel_wait(ioport);
     ioport->sequence_done_cond.wait(sequence);
   }
   return std::unique_lock(ioport->lock);

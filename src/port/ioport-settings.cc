@@ -1,5 +1,7 @@
 // The user's settings of a port: names, active-low sense, direction.
+#include "base/log.h"
 #include "port/ioport-private.h"
+#include "port/port-name.h"
 
 namespace {
 
@@ -10,6 +12,9 @@ bool name_in_use(const IOPort *ioport, bool input) {
 // A step of a running sequence comes before the new declaration or after it: in between it would be
 // sent to nobody.
 bool set_name(IOPort *ioport, bool input, const std::string &name) {
+  if (!port_name_valid(name)) {
+    return false;
+  }
   const std::lock_guard lock(ioport->lock);
   auto &held = input ? ioport->input_name : ioport->output_name;
   if (held == name) {
@@ -17,7 +22,7 @@ bool set_name(IOPort *ioport, bool input, const std::string &name) {
   }
   held = name;
   if (name_in_use(ioport, input)) {
-    io_port_redeclare_events(ioport);
+    io_port_redeclare_events_locked(ioport);
   }
   return true;
 }
@@ -45,7 +50,7 @@ void change_output_sense(IOPort *ioport, bool activelow) {
   io_port_reset_event_filters(ioport);
   ioport->activelow_output = activelow;
   if (ioport->set_up && !io_port_input(ioport)) {
-    const bool raw = ioport->functions->get_state(ioport) > 0;
+    const bool raw = io_port_read_level(ioport) > 0;
     io_port_set_state_internal(ioport, activelow == raw);
   }
 }
@@ -87,6 +92,11 @@ void io_port_restore_activelow(IOPort *ioport, bool activelow, bool input) {
 }
 
 void io_port_restore_name(IOPort *ioport, std::optional<std::string> name, bool input) {
+  if (name && !port_name_valid(*name)) {
+    log_warning("Port %s: the %s name is left out: it is not UTF-8 or has more than %zu bytes",
+                io_port_describe(ioport), input ? "input" : "output", kPortNameMaxBytes);
+    return;
+  }
   (input ? ioport->input_name : ioport->output_name) = std::move(name);
 }
 
@@ -114,7 +124,7 @@ bool io_port_set_direction(IOPort *ioport, bool input) {
     return false;
   }
   const auto lock = io_port_stop_sequence_and_lock(ioport);
-  ioport->direction = input;
+  const bool changed = ioport->direction.exchange(input) != input;
   if (!ioport->set_up) {
     return true;
   }
@@ -122,7 +132,7 @@ bool io_port_set_direction(IOPort *ioport, bool input) {
     ioport->functions->set_direction(ioport, input);
   }
   io_port_set_watch(ioport);
-  io_port_declare_events_for_role(ioport);
+  io_port_declare_events_for_role(ioport, changed);
   report_current_state(ioport);
   return true;
 }

@@ -9,7 +9,7 @@ namespace {
 constexpr std::uint32_t kUnknownLevel = 2;  // and everything above
 
 bool is_driven_output(const IOPort *ioport) {
-  return !io_port_input(ioport) && ioport->backend != kVirtualBackend && ioport->set_up;
+  return !io_port_input(ioport) && ioport->backend != BACKEND_VIRTUAL && ioport->set_up;
 }
 
 }  // namespace
@@ -43,12 +43,24 @@ bool io_port_get_activelow(const IOPort *ioport, bool input) {
   return input ? ioport->activelow_input : ioport->activelow_output;
 }
 
+std::uint32_t io_port_read_level(IOPort *ioport) {
+  return io_port_backend_serves(ioport) && ioport->functions->get_state
+             ? ioport->functions->get_state(ioport)
+             : 0;
+}
+
+void io_port_write_level(IOPort *ioport, std::int32_t level) {
+  if (io_port_backend_serves(ioport) && ioport->functions->set_state) {
+    ioport->functions->set_state(ioport, level);
+  }
+}
+
 bool io_port_get_state(IOPort *ioport) {
   g_assert(ioport);
   if (!ioport->set_up) {
     return false;
   }
-  const std::uint32_t raw = ioport->functions->get_state(ioport);
+  const std::uint32_t raw = io_port_read_level(ioport);
   if (raw >= kUnknownLevel) {
     return false;
   }
@@ -69,7 +81,7 @@ bool io_port_set_state(IOPort *ioport, bool state) {
 void io_port_set_state_internal(IOPort *ioport, bool state) {
   g_return_if_fail(ioport != NULL);
   const bool old = io_port_get_state(ioport);
-  ioport->functions->set_state(ioport, state != ioport->activelow_output);
+  io_port_write_level(ioport, state != ioport->activelow_output);
   const bool now = io_port_get_state(ioport);
   if (now != old) {
     io_port_report_state(ioport, now);
@@ -80,9 +92,8 @@ bool io_port_set_virtual(IOPort *ioport, bool state) {
   if (!ioport->events_enabled) {
     return true;
   }
-  if (ioport->backend == kVirtualBackend && ioport->type == PORT_OUTPUT &&
-      io_port_backend_serves(ioport)) {
-    ioport->functions->set_state(ioport, state);
+  if (ioport->backend == BACKEND_VIRTUAL && ioport->type == PORT_OUTPUT) {
+    io_port_write_level(ioport, state);
   }
   io_port_fire_events(ioport, state);
   io_port_send_signal(ioport, true, state);
@@ -92,6 +103,12 @@ bool io_port_set_virtual(IOPort *ioport, bool state) {
 void io_port_report_state(IOPort *ioport, std::int32_t state) {
   io_port_fire_events(ioport, state);
   io_port_send_signal(ioport, false, state != 0);
+}
+
+void io_port_report_line(IOPort *ioport, SupervisedRangeState line) {
+  const bool state = io_port_get_state(ioport);
+  io_port_fire_line_events(ioport, state, static_cast<std::int32_t>(line));
+  io_port_send_signal(ioport, false, state);
 }
 
 void io_port_send_signal(IOPort *port, bool virtual_change, bool state) {

@@ -2,42 +2,37 @@
 #include "port/ioport.h"
 
 #include <algorithm>
-#include <array>
 
 #include "base/log.h"
+#include "base/main-queue.h"
 #include "port/ioport-private.h"
 #include "port/port-listener.h"
 
 namespace {
 
-constexpr int kBackendKinds = 10;
-
-struct Backend {
-  MakePortFunctions make = nullptr;
-  const char *word = nullptr;
-};
-
-std::array<Backend, kBackendKinds> &backends() {
-  static std::array<Backend, kBackendKinds> table{};
+std::vector<Backend> &backends() {
+  static std::vector<Backend> table;
   return table;
 }
 
-bool kind_in_range(int kind) {
-  return kind >= 0 && kind < kBackendKinds;
+const PortFunctions *functions_of(BackendKind kind) {
+  const auto &table = backends();
+  const auto found = std::find_if(table.begin(), table.end(),
+                                  [&](const Backend &backend) { return backend.kind == kind; });
+  return found == table.end() ? nullptr : found->functions;
 }
 
-void install_backend(IOPort *ioport) {
-  const MakePortFunctions make = backends().at(static_cast<size_t>(ioport->backend)).make;
-  if (make) {
-    ioport->functions = make(ioport);
+void make_record(IOPort *ioport) {
+  if (ioport->functions && ioport->functions->make_record && !ioport->backend_data) {
+    ioport->backend_data = ioport->functions->make_record();
   }
 }
 
-void release_backend(IOPort *ioport) {
-  if (io_port_backend_serves(ioport) && ioport->functions->free) {
-    ioport->functions->free(ioport);
-    ioport->backend_released = true;
+void destroy_record(IOPort *ioport) {
+  if (io_port_backend_serves(ioport) && ioport->functions->drop) {
+    ioport->functions->drop(ioport);
   }
+  ioport->backend_data.reset();
 }
 
 void apply_backend_property(IOPort *ioport, const BackendProperty &property) {
@@ -54,13 +49,13 @@ void rebuild_released_backend(IOPort *ioport) {
     return;
   }
   ioport->backend_released = false;
-  install_backend(ioport);
+  make_record(ioport);
   // The description's ranges are only the first ones; the user may have set others since.
-  const SupervisedRanges ranges = ioport->supervised_ranges;
+  SupervisedRanges ranges = io_port_range_list(ioport);
   for (const auto &property : ioport->backend_properties) {
     apply_backend_property(ioport, property);
   }
-  ioport->supervised_ranges = ranges;
+  io_port_store_range_list(ioport, std::move(ranges));
 }
 
 }  // namespace
@@ -89,44 +84,35 @@ void io_port_unref(IOPort *ioport) {
 void io_port_destroy(IOPort *ioport) {
   io_port_stop_sequence_and_lock(ioport).unlock();
   io_port_undeclare_events(ioport);
-  release_backend(ioport);
+  destroy_record(ioport);
   delete ioport;
 }
 
-void io_port_register_backend(int kind, MakePortFunctions make, const char *word) {
-  if (!kind_in_range(kind)) {
-    return;
-  }
-  Backend &backend = backends().at(static_cast<size_t>(kind));
-  backend.make = make;
-  if (word) {
-    backend.word = word;
-  }
+void io_port_register_backend(const Backend &backend) {
+  auto &table = backends();
+  std::erase_if(table, [&](const Backend &known) { return known.kind == backend.kind; });
+  table.push_back(backend);
 }
 
-std::optional<int> io_port_backend_kind(std::string_view word) {
+std::optional<BackendKind> io_port_backend_kind(std::string_view word) {
   const auto &table = backends();
-  const auto *const found = std::find_if(table.begin(), table.end(), [&](const Backend &backend) {
-    return backend.word && backend.word == word;
-  });
-  return found == table.end() ? std::nullopt
-                              : std::optional<int>(static_cast<int>(found - table.begin()));
+  const auto found = std::find_if(table.begin(), table.end(),
+                                  [&](const Backend &backend) { return backend.word == word; });
+  return found == table.end() ? std::nullopt : std::optional(found->kind);
 }
 
-void io_port_set_backend(IOPort *ioport, int kind) {
-  if (ioport->functions && ioport->backend != kind) {
-    release_backend(ioport);  // the next backend must not find the record of another
-    ioport->functions = nullptr;
+void io_port_set_backend(IOPort *ioport, BackendKind kind) {
+  if (ioport->backend != kind) {
+    destroy_record(ioport);  // the next backend must not find the record of another
     ioport->backend_properties.clear();
   }
   ioport->backend = kind;
+  ioport->functions = functions_of(kind);
   ioport->backend_released = false;
-  if (kind_in_range(kind)) {
-    install_backend(ioport);
-  }
+  make_record(ioport);
 }
 
-int io_port_get_backend(const IOPort *ioport) {
+BackendKind io_port_get_backend(const IOPort *ioport) {
   return ioport->backend;
 }
 
@@ -150,23 +136,36 @@ PortBackendData *io_port_backend_data(const IOPort *ioport) {
   return ioport->backend_data.get();
 }
 
-void io_port_set_backend_data(IOPort *ioport, std::unique_ptr<PortBackendData> data) {
-  ioport->backend_data = std::move(data);
-}
-
-bool io_port_setup(IOPort *port) {
+bool io_port_begin_setup(IOPort *port) {
   g_assert(port != NULL);
   g_assert(port->functions != NULL);
   rebuild_released_backend(port);
-  const bool ok = port->functions->setup(port, port->activelow_output);
+  const bool ok = !port->functions->setup || port->functions->setup(port, port->activelow_output);
   if (ok) {
     port->set_up = true;
   }
   return ok;
 }
 
+bool io_port_setup(IOPort *port) {
+  if (io_port_begin_setup(port)) {
+    return true;
+  }
+  bool settled = false;
+  io_port_when_settled(port, [&] { settled = true; });
+  if (settled) {
+    return false;  // nothing is under way
+  }
+  serve_main_loop_until([&] { return settled; });
+  return port->set_up;
+}
+
 bool io_port_is_set_up(const IOPort *ioport) {
   return ioport->set_up;
+}
+
+void io_port_finish_setup(IOPort *ioport) {
+  ioport->set_up = true;
 }
 
 void io_port_drop(IOPort *ioport) {
@@ -175,10 +174,13 @@ void io_port_drop(IOPort *ioport) {
   }
   const auto lock = io_port_stop_sequence_and_lock(ioport);
   ioport->set_up = false;
+  // What they last said would stay listed: a siren that is gone would be on for ever.
+  io_port_undeclare_events(ioport);
   if (ioport->functions->drop) {
     ioport->functions->drop(ioport);
   } else {
-    release_backend(ioport);
+    destroy_record(ioport);
+    ioport->backend_released = true;
   }
 }
 

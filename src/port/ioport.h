@@ -8,7 +8,9 @@
 
 #include <glib.h>
 
+#include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -19,9 +21,6 @@
 #include "port/io-event.h"
 #include "port/port-functions.h"
 #include "port/supervised-range.h"
-
-// The backend of ports that exist in memory only: clients report their states, nothing drives them.
-inline constexpr int kVirtualBackend = 0;
 
 enum PortType {
   PORT_INPUT = 0,
@@ -50,39 +49,35 @@ using IOPortRef = std::unique_ptr<IOPort, IOPortUnref>;
 
 // --- Backend ------------------------------------------------------------------------------------
 
-// Makes the backend's table known, with the operation that installs it: that gives the port its
-// private record if it has none. `word`, a literal, is what the hardware description calls the
-// backend; none keeps the word that the kind has. Kinds outside 0 to 9 are ignored.
-using MakePortFunctions = const PortFunctions *(*)(IOPort *port);
-void io_port_register_backend(int kind, MakePortFunctions make, const char *word = nullptr);
+// Makes a backend known, in place of an earlier one of its kind. Its word and its table must stay
+// for good.
+void io_port_register_backend(const Backend &backend);
 // The kind for a word of the hardware description, compared exactly.
-std::optional<int> io_port_backend_kind(std::string_view word);
-// Chooses the backend. A kind that nobody registered leaves the port without a table.
-void io_port_set_backend(IOPort *ioport, int kind);
-int io_port_get_backend(const IOPort *ioport);
+std::optional<BackendKind> io_port_backend_kind(std::string_view word);
+// Chooses the backend, and gives the port its private record if it has none. A kind that nobody
+// registered leaves the port without a table.
+void io_port_set_backend(IOPort *ioport, BackendKind kind);
+BackendKind io_port_get_backend(const IOPort *ioport);
 // Whether the port has a table. The operations that say "needs a backend" may be called only then.
 bool io_port_has_backend(const IOPort *ioport);
 // Hands an attribute of the hardware description to the backend. Without a backend it is lost, with
 // a warning.
 void io_port_set_backend_property(IOPort *ioport, const char *section, const char *key,
                                   const char *value);
-// The backend's private record. Any thread that may call the backend.
+// The backend's private record: never null while the backend is called, if it has one at all. Any
+// thread that may call the backend.
 PortBackendData *io_port_backend_data(const IOPort *ioport);
-void io_port_set_backend_data(IOPort *ioport, std::unique_ptr<PortBackendData> data);
-
-// Gives the port a record of the backend's type if it has none, and returns it.
-template <typename Data>
-Data *io_port_make_backend_data(IOPort *ioport) {
-  if (!io_port_backend_data(ioport)) {
-    io_port_set_backend_data(ioport, std::make_unique<Data>());
-  }
-  return static_cast<Data *>(io_port_backend_data(ioport));
-}
 
 // Brings the backend up; needs a backend. A port that was dropped gets a fresh backend first, with
-// the attributes of the hardware description.
+// the attributes of the hardware description. False: it does not come up, or it has to wait for a
+// service first; once io_port_when_settled() calls, io_port_is_set_up() tells.
+bool io_port_begin_setup(IOPort *ioport);
+// The same for who needs the outcome at once: serves the main loop's sources until the port has
+// settled.
 bool io_port_setup(IOPort *ioport);
 bool io_port_is_set_up(const IOPort *ioport);
+// For a backend whose set-up had to ask a service first: the port is in service from now on.
+void io_port_finish_setup(IOPort *ioport);
 // Takes the port out of service: ends a running sequence and lets the backend release what it
 // holds. The port reads 0 and refuses to be driven until it is set up again.
 void io_port_drop(IOPort *ioport);
@@ -155,6 +150,13 @@ bool io_port_set_virtual(IOPort *ioport, bool state);
 void io_port_report_state(IOPort *ioport, std::int32_t state);
 // Emits PortChanged while the port's events are enabled. Any thread.
 void io_port_send_signal(IOPort *ioport, bool virtual_change, bool state);
+// The same for an input whose backend knows the state of the line apart from the level: events for
+// supervised inputs are told the line, all others, and PortChanged, the logical state.
+void io_port_report_line(IOPort *ioport, SupervisedRangeState line);
+// Calls `settled` when a service that the port depends on has answered, or failed to answer, what
+// was asked of it for the port so far: at once when nothing is under way, else from the main loop.
+// Nobody waits meanwhile, and the port can be used.
+void io_port_when_settled(IOPort *ioport, std::function<void()> settled);
 // Arms the backend's watch while the port acts as an input and its events are enabled. Needs a
 // backend.
 void io_port_set_watch(IOPort *ioport);
@@ -166,8 +168,8 @@ std::optional<std::string> io_port_get_name(const IOPort *ioport);
 // The names that apply to the port's type; the others are left alone. Null does nothing.
 void io_port_get_names(const IOPort *ioport, std::optional<std::string> *input_name,
                        std::optional<std::string> *output_name);
-// False for a null port and for a port type without that side. A changed name in use makes the
-// port's events known anew.
+// False for a null port, for a port type without that side and for a text that can't be a name
+// (port/port-name.h). A changed name in use makes the port's events known anew.
 bool io_port_set_input_name(IOPort *ioport, const std::string &name);
 bool io_port_set_output_name(IOPort *ioport, const std::string &name);
 
@@ -175,6 +177,7 @@ bool io_port_set_output_name(IOPort *ioport, const std::string &name);
 
 void io_port_restore_direction(IOPort *ioport, bool input);
 void io_port_restore_activelow(IOPort *ioport, bool activelow, bool input);
+// What can't be a name is left out, with a warning.
 void io_port_restore_name(IOPort *ioport, std::optional<std::string> name, bool input);
 void io_port_restore_supervised(IOPort *ioport, bool supervised);
 
@@ -223,6 +226,7 @@ void io_port_set_events_enabled(IOPort *ioport, bool enabled);
 // Declares every event of the port; needs a backend. What can't be declared is logged.
 void io_port_declare_events(IOPort *ioport);
 // Withdraws every event and declares those that apply, since what they say of the port has changed.
+// Takes the port's lock: a step of a running sequence comes before or after it.
 void io_port_redeclare_events(IOPort *ioport);
 void io_port_reset_event_filters(IOPort *ioport);
 // Whether one of the port's events is the shared any-port event. False while events are off.
@@ -236,6 +240,9 @@ struct ActionStep {
   // bits, which wrap: a time above 2,147,483 ms may end early, one below -2,147,483 ms may wait.
   std::int32_t time_ms;
 };
+
+// The most steps that a client may ask for in one sequence.
+inline constexpr std::size_t kMaxSequenceSteps = 65'536;
 
 struct ActionSequence {
   bool is_virtual;  // reports the states instead of driving the port

@@ -2,6 +2,8 @@
 // slots at start-up; an empty slot means "not up yet" and is skipped without a word.
 #pragma once
 
+#include <gio/gio.h>
+
 #include <cstdint>
 
 struct IOPort;
@@ -29,6 +31,10 @@ struct PortListener {
   // Also from action threads.
   void (*port_changed)(const PortChange &change) = nullptr;
   void (*action_sequence_done)(int number) = nullptr;
+  // Waits until what was reported so far has been taken by those who pass it on, or until
+  // `deadline_us` of the monotonic clock, or until `cancelled` is. On action threads, which hold no
+  // lock meanwhile.
+  void (*wait_until_sent)(GCancellable *cancelled, std::int64_t deadline_us) = nullptr;
 };
 
 // The one table of the process. Fill slots before watches are armed and before the main loop serves

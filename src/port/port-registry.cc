@@ -2,10 +2,11 @@
 
 #include <algorithm>
 #include <iterator>
-#include <unordered_set>
+#include <memory>
 #include <utility>
 
 #include "base/log.h"
+#include "base/main-queue.h"
 #include "port/ioport-private.h"
 
 namespace {
@@ -54,12 +55,12 @@ std::uint32_t count_role(bool input) {
 
 // A document may declare a port without a backend, or name one that does not exist. Such a port is
 // kept, so that it can be listed, but it never comes into service.
-bool set_up(IOPort *ioport) {
-  if (!io_port_has_backend(ioport)) {
+void set_up(IOPort *ioport) {
+  if (io_port_has_backend(ioport)) {
+    io_port_begin_setup(ioport);
+  } else {
     log_warning("Port %s has no backend and stays out of service", io_port_describe(ioport));
-    return false;
   }
-  return io_port_setup(ioport);
 }
 
 // Moves the ports of `from` that satisfy `moves` to the front of `to`, first to last.
@@ -94,16 +95,59 @@ std::vector<IOPortRef> snapshot_with_backend() {
   return ports;
 }
 
-// Sets up the ports of a list, without the lock: a backend may wait for its service, and it may
-// declare events, whose library may ask the registry. Gives the ports for which set-up ended so.
-std::unordered_set<const IOPort *> set_up_all(const Ports &list, bool outcome) {
-  std::unordered_set<const IOPort *> chosen;
-  for (const auto &ioport : snapshot(list)) {
-    if (set_up(ioport.get()) == outcome) {
-      chosen.insert(ioport.get());
+void when_all_settled(const std::vector<IOPortRef> &ports, std::function<void()> done) {
+  const auto left = std::make_shared<std::size_t>(ports.size() + 1);
+  const auto one_settled = [left, done = std::move(done)] {
+    if (--*left == 0) {
+      done();
     }
+  };
+  for (const auto &ioport : ports) {
+    io_port_when_settled(ioport.get(), one_settled);
   }
-  return chosen;
+  one_settled();
+}
+
+// Sets up the ports of a list, without the lock: a backend may declare events, whose library may
+// ask the registry. `done` is called when it is clear which of them came up.
+void set_up_all(const Ports &list, std::function<void()> done) {
+  const auto ports = snapshot(list);
+  for (const auto &ioport : ports) {
+    set_up(ioport.get());
+  }
+  when_all_settled(ports, std::move(done));
+}
+
+// Who asked for the parked ports to be tried, and whether a pass is under way. Main thread.
+struct Retries {
+  std::vector<std::function<void(std::size_t)>> waiting;
+  bool running = false;
+};
+
+Retries &retries() {
+  static Retries instance;
+  return instance;
+}
+
+std::size_t bring_back() {
+  const std::lock_guard lock(registry().lock);
+  return move_ports(registry().parked, registry().active,
+                    [](const IOPort *ioport) { return ioport->set_up.load(); });
+}
+
+void retry_parked() {
+  const auto callers = std::exchange(retries().waiting, {});
+  retries().running = true;
+  set_up_all(registry().parked, [callers] {
+    retries().running = false;
+    const std::size_t count = bring_back();
+    for (const auto &done : callers) {
+      done(count);
+    }
+    if (!retries().waiting.empty() && !retries().running) {
+      retry_parked();
+    }
+  });
 }
 
 std::string default_input_name(const IOPort *ioport, int inputs_seen) {
@@ -225,17 +269,19 @@ void port_registry_assign_default_names() {
 }
 
 void port_registry_setup_all() {
-  const auto failed = set_up_all(registry().active, false);
+  bool settled = false;
+  set_up_all(registry().active, [&] { settled = true; });
+  serve_main_loop_until([&] { return settled; });
   const std::lock_guard lock(registry().lock);
   move_ports(registry().active, registry().parked,
-             [&](const IOPort *ioport) { return ioport->optional && failed.count(ioport) > 0; });
+             [](const IOPort *ioport) { return ioport->optional && !ioport->set_up; });
 }
 
-std::size_t port_registry_retry_parked() {
-  const auto ready = set_up_all(registry().parked, true);
-  const std::lock_guard lock(registry().lock);
-  return move_ports(registry().parked, registry().active,
-                    [&](const IOPort *ioport) { return ready.count(ioport) > 0; });
+void port_registry_retry_parked(std::function<void(std::size_t)> done) {
+  retries().waiting.push_back(std::move(done));
+  if (!retries().running) {
+    retry_parked();
+  }
 }
 
 void port_registry_park(IOPort *ioport) {
@@ -270,6 +316,7 @@ void port_registry_drop_all() {
     io_port_stop_sequence_and_lock(ioport).unlock();
   }
   io_port_wait_for_action_threads();
+  run_posted_work();  // what is still under way for a port must not outlive it
   for (IOPort *ioport : ports) {
     io_port_destroy(ioport);
   }

@@ -44,10 +44,12 @@ void port_registry_for_each(const std::function<void(IOPort *)> &visit);
 // Names the ports that have none yet: "Input 1", "Output 1" and so on, by rising port number.
 void port_registry_assign_default_names();
 // Sets up every port. An optional port that fails is parked. Neither pass holds the lock while it
-// calls a backend.
+// calls a backend. This one serves the main loop's sources while ports wait for a service, so it is
+// for start-up; the other one waits for nobody.
 void port_registry_setup_all();
-// Tries the parked ports again and gives the number that came back.
-std::size_t port_registry_retry_parked();
+// Tries the parked ports again and calls `done` with the number that came back, when the last of
+// them has settled. What is asked for during a pass begins with the next one.
+void port_registry_retry_parked(std::function<void(std::size_t)> done);
 // Parks an optional port; others stay where they are.
 void port_registry_park(IOPort *ioport);
 void port_registry_arm_watches();

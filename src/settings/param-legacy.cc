@@ -12,9 +12,12 @@
 
 #include "base/glib-ptr.h"
 #include "base/log.h"
+#include "base/service-account.h"
+#include "base/trusted-file.h"
 #include "platform/confutils.h"
 #include "port/ioport.h"
 #include "port/port-error.h"
+#include "port/port-name.h"
 #include "port/port-registry.h"
 #include "settings/setting-words.h"
 
@@ -24,6 +27,7 @@ constexpr std::string_view kPortPrefix = "IOPort.I";
 constexpr std::string_view kInput = "Input";
 constexpr std::string_view kOutput = "Output";
 constexpr int kDecimal = 10;
+constexpr std::size_t kMostBytes = 1'048'576;
 
 // Whether to go on after a key.
 enum class Next { kKey, kGroup, kStop };
@@ -74,7 +78,7 @@ IOPortRef find_port(std::uint64_t number) {
 }
 
 // Names come from firmware that did not check them, and go where only UTF-8 is allowed.
-std::string import_name(std::string_view raw) {
+std::string readable_name(std::string_view raw) {
   const GCharPtr valid(g_utf8_make_valid(raw.data(), static_cast<gssize>(raw.size())));
   const std::string_view name = valid.get();
   if (name.empty() || name.front() != '"') {
@@ -82,6 +86,18 @@ std::string import_name(std::string_view raw) {
   }
   const char *last = g_utf8_prev_char(name.data() + name.size());
   return last == name.data() ? std::string() : std::string(name.data() + 1, last);
+}
+
+void import_name(const Group &group, const Entry &entry, IOPort *ioport, bool input) {
+  const std::string name = readable_name(entry.value);
+  if (!port_name_valid(name)) {
+    log_warning("%s in group %s is too long for a name of port %s and is left out", entry.key,
+                group.name, io_port_describe(ioport));
+  } else if (input) {
+    io_port_set_input_name(ioport, name);
+  } else {
+    io_port_set_output_name(ioport, name);
+  }
 }
 
 // A number that 32 bits can't hold is no time that the older store could have meant.
@@ -111,7 +127,7 @@ Next import_input(const Group &group, const Entry &entry, std::uint64_t number) 
   }
   const std::string_view key = entry.key;
   if (key == "Name") {
-    io_port_set_input_name(ioport.get(), import_name(entry.value));
+    import_name(group, entry, ioport.get(), true);
     return Next::kKey;
   }
   return key == "Trig" ? import_sense(group, entry, ioport.get(), true)
@@ -122,7 +138,7 @@ Next import_input(const Group &group, const Entry &entry, std::uint64_t number) 
 bool import_output_behaviour(const Group &group, const Entry &entry, IOPort *ioport) {
   const std::string_view key = entry.key;
   if (key == "Name") {
-    io_port_set_output_name(ioport, import_name(entry.value));
+    import_name(group, entry, ioport, false);
   } else if (key == "Button") {
     io_port_set_button(ioport, parse_button(entry.value).value_or(io_port_get_button(ioport)));
   } else if (key == "PulseTime") {
@@ -242,13 +258,28 @@ bool store(GKeyFile *file, const char *path) {
 
 }  // namespace
 
-void param_import_parhand(const char *file, GError **error) {
-  if (!g_file_test(file, G_FILE_TEST_EXISTS)) {
-    log_warning("Unable to read from parhand file");
-    return;
+std::optional<std::string> param_read_parhand(const char *path) {
+  Error error;
+  const RegularFile file = open_regular_file(path, error.out());
+  if (error.matches(G_FILE_ERROR, G_FILE_ERROR_NOENT)) {
+    return std::nullopt;
   }
-  const GKeyFilePtr key_file = load(file, G_KEY_FILE_KEEP_COMMENTS);
-  if (!key_file) {
+  if (file.fd && !is_own_account(file.status.st_uid)) {
+    log_warning("Left %s alone: it belongs to uid %u", path,
+                static_cast<unsigned>(file.status.st_uid));
+    return std::nullopt;
+  }
+  auto text = file.fd ? read_file(file, kMostBytes, error.out()) : std::nullopt;
+  if (!text) {
+    log_warning("Left %s alone: %s", path, error.message());
+  }
+  return text;
+}
+
+void param_import_parhand_text(const std::string &text, GError **error) {
+  const GKeyFilePtr key_file(g_key_file_new());
+  if (!g_key_file_load_from_data(key_file.get(), text.data(), text.size(), G_KEY_FILE_KEEP_COMMENTS,
+                                 nullptr)) {
     return;
   }
   const GStrvPtr groups(g_key_file_get_groups(key_file.get(), nullptr));
@@ -256,6 +287,14 @@ void param_import_parhand(const char *file, GError **error) {
     if (import_group(key_file.get(), {*name, error}) == Next::kStop) {
       return;
     }
+  }
+}
+
+void param_import_parhand(const char *file, GError **error) {
+  if (const auto text = param_read_parhand(file)) {
+    param_import_parhand_text(*text, error);
+  } else {
+    log_warning("Unable to read from parhand file");
   }
 }
 

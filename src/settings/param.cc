@@ -1,260 +1,128 @@
 #include "settings/param.h"
 
-#include <grp.h>
-#include <pwd.h>
-#include <unistd.h>
-
 #include <algorithm>
-#include <cerrno>
 #include <cstdio>
+#include <functional>
+#include <map>
 #include <mutex>
 #include <optional>
 #include <utility>
 #include <vector>
 
 #include "base/glib-ptr.h"
-#include "base/log.h"
+#include "base/trusted-file.h"
 #include "platform/confutils.h"
 #include "port/ioport.h"
 #include "port/port-registry.h"
-#include "settings/setting-words.h"
+#include "settings/port-settings.h"
+#include "settings/storage-writer.h"
 
 namespace {
 
-constexpr const char *kServiceAccount = "pcd";
-
+// The file in memory, and the order in which files are read and replaced. Held while storage is
+// waited for, so never taken by a request.
 std::mutex settings_lock;
 GKeyFilePtr key_file;  // guarded by settings_lock; none between two operations in normal service
+std::string key_file_path;  // guarded by settings_lock; where it was read from
 
-bool has_input_side(const IOPort *ioport) {
-  return io_port_get_type(ioport) != PORT_OUTPUT;
-}
-
-bool has_output_side(const IOPort *ioport) {
-  return io_port_get_type(ioport) != PORT_INPUT;
-}
-
-// --- Reading a group into a port ---
-
-// One port's group. Every step says whether to go on: it does not after a key that is missing or
-// malformed, which leaves an error, nor after an unknown word for the button, which leaves none.
-class GroupReader {
- public:
-  GroupReader(IOPort *ioport, const char *group) : ioport_(ioport), group_(group) {}
-
-  void read() {
-    (void)(read_direction() && read_input_side() && read_output_side() && read_supervision());
-  }
-  const Error &error() const { return error_; }
-
- private:
-  bool get_boolean(const char *key, bool *value) {
-    *value = g_key_file_get_boolean(key_file.get(), group_, key, error_.out());
-    return !error_;
-  }
-  bool get_uint64(const char *key, std::uint64_t *value) {
-    *value = g_key_file_get_uint64(key_file.get(), group_, key, error_.out());
-    return !error_;
-  }
-  GCharPtr get_string(const char *key) {
-    return GCharPtr(g_key_file_get_string(key_file.get(), group_, key, error_.out()));
-  }
-
-  bool read_direction();
-  bool read_side(bool input);
-  bool read_input_side();
-  bool read_output_side();
-  bool read_button();
-  bool read_times_and_mode();
-  bool read_ranges(SupervisedRanges *ranges);
-  bool read_supervision();
-
-  IOPort *ioport_;
-  const char *group_;
-  Error error_;
+// What was asked for and is not being stored yet, by file. The lock is taken last.
+struct Waiting {
+  std::vector<PortSettings> settings;
+  std::vector<std::function<void()>> ended;  // whom to tell
 };
+std::mutex waiting_lock;
+std::map<std::string, Waiting> waiting;  // guarded by waiting_lock
 
-bool GroupReader::read_direction() {
-  if (io_port_get_type(ioport_) != PORT_CONFIGURABLE) {
-    return true;
-  }
-  bool input = false;
-  if (!get_boolean("input", &input)) {
-    return false;
-  }
-  io_port_restore_direction(ioport_, input);
-  return true;
-}
+// --- Requests ---
 
-bool GroupReader::read_side(bool input) {
-  const char *side = input ? "input" : "output";
-  io_port_restore_name(ioport_, std::nullopt, input);
-  const GCharPtr name = get_string(input ? "input_name" : "output_name");
-  if (!name) {
-    std::printf("No %s name for port %s:%d\n", side, group_, io_port_get_number(ioport_));
-    return false;
-  }
-  io_port_restore_name(ioport_, name.get(), input);
-  bool activelow = false;
-  if (!get_boolean(input ? "input_activelow" : "output_activelow", &activelow)) {
-    return false;
-  }
-  io_port_restore_activelow(ioport_, activelow, input);
-  return true;
-}
-
-bool GroupReader::read_input_side() {
-  return !has_input_side(ioport_) || read_side(true);
-}
-
-bool GroupReader::read_output_side() {
-  return !has_output_side(ioport_) || (read_side(false) && read_button() && read_times_and_mode());
-}
-
-bool GroupReader::read_button() {
-  const GCharPtr word = get_string("button_type");
-  if (!word) {
-    return false;
-  }
-  const auto button = parse_button(word.get());
-  if (!button) {
-    return false;
-  }
-  io_port_set_button(ioport_, *button);
-  return true;
-}
-
-bool GroupReader::read_times_and_mode() {
-  std::uint64_t time = 0;
-  if (!get_uint64("pulse_time", &time)) {
-    return false;
-  }
-  io_port_set_pulse_time(ioport_, static_cast<std::uint32_t>(time));
-  const GCharPtr mode = get_string("port_mode");
-  if (!mode) {
-    return false;
-  }
-  io_port_set_mode(ioport_, parse_mode(mode.get()).value_or(PORT_MODE_MONOSTABLE));
-  if (!get_uint64("delay_time", &time)) {
-    return false;
-  }
-  io_port_set_delay_time(ioport_, static_cast<std::int32_t>(time));
-  return true;
-}
-
-bool GroupReader::read_ranges(SupervisedRanges *ranges) {
-  const GCharPtr text = get_string("supervised_input_ranges");
-  if (!text) {
-    return false;
-  }
-  const GVariantPtr variant(
-      g_variant_parse(G_VARIANT_TYPE("a(suu)"), text.get(), nullptr, nullptr, error_.out()));
-  if (!variant) {
-    return false;
-  }
-  *ranges = supervised_ranges_from_variant(variant.get());
-  return true;
-}
-
-// The flag is put in place as it is: the backend learns of it when it is set up.
-bool GroupReader::read_supervision() {
-  if (!io_port_is_supervisable(ioport_)) {
-    return true;
-  }
-  SupervisedRanges ranges;
-  bool supervised = false;
-  if (!read_ranges(&ranges) ||
-      !io_port_set_supervised_ranges(ioport_, std::move(ranges), error_.out()) ||
-      !get_boolean("supervised_input", &supervised)) {
-    return false;
-  }
-  io_port_restore_supervised(ioport_, supervised);
-  return true;
-}
-
-// --- Writing a port into its group ---
-
-void set_string(const char *group, const char *key, const std::string &value) {
-  g_key_file_set_string(key_file.get(), group, key, value.c_str());
-}
-
-void write_side(IOPort *ioport, const char *group, bool input) {
-  std::optional<std::string> input_name;
-  std::optional<std::string> output_name;
-  io_port_get_names(ioport, &input_name, &output_name);
-  set_string(group, input ? "input_name" : "output_name",
-             (input ? input_name : output_name).value_or(""));
-  g_key_file_set_boolean(key_file.get(), group, input ? "input_activelow" : "output_activelow",
-                         io_port_get_activelow(ioport, input));
-}
-
-void write_output_behaviour(IOPort *ioport, const char *group) {
-  const std::string button = button_word(io_port_get_button(ioport));
-  if (!button.empty()) {
-    set_string(group, "button_type", button);
-  }
-  g_key_file_set_uint64(key_file.get(), group, "pulse_time", io_port_get_pulse_time(ioport));
-  set_string(group, "port_mode", mode_word(io_port_get_mode(ioport)));
-  // A negative time becomes a very large number: the file has always been read back that way.
-  g_key_file_set_uint64(key_file.get(), group, "delay_time",
-                        static_cast<std::uint64_t>(std::int64_t{io_port_get_delay_time(ioport)}));
-}
-
-void write_supervision(IOPort *ioport, const char *group) {
-  SupervisedRanges ranges;
-  io_port_get_supervised_ranges(ioport, &ranges);
-  const GVariantPtr variant(g_variant_ref_sink(supervised_ranges_to_variant(ranges)));
-  const GCharPtr text(g_variant_print(variant.get(), TRUE));
-  set_string(group, "supervised_input_ranges", text.get());
-  g_key_file_set_boolean(key_file.get(), group, "supervised_input", io_port_is_supervised(ioport));
-}
-
-void write_group(IOPort *ioport, const char *group) {
-  if (io_port_get_type(ioport) == PORT_CONFIGURABLE) {
-    g_key_file_set_boolean(key_file.get(), group, "input", io_port_direction_input(ioport));
-  }
-  if (has_input_side(ioport)) {
-    write_side(ioport, group, true);
-  }
-  if (has_output_side(ioport)) {
-    write_side(ioport, group, false);
-    write_output_behaviour(ioport, group);
-  }
-  if (io_port_is_supervisable(ioport)) {
-    write_supervision(ioport, group);
-  }
-}
-
-// The port's group, or none, said on standard error, when it can't have one: GLib takes anything
-// for a group name but brackets, control characters and nothing at all.
-const char *group_of(IOPort *ioport) {
-  const auto &id = io_port_get_id(ioport);
-  if (!id) {
-    std::fputs("Port does not have a name!\n", stderr);
-    return nullptr;
-  }
-  const bool usable = !id->empty() && std::none_of(id->begin(), id->end(), [](char c) {
-    return c == '[' || c == ']' || g_ascii_iscntrl(c);
+// A later request of the same port takes the place of the earlier one.
+void put(std::vector<PortSettings> &all, PortSettings settings) {
+  const auto same = std::find_if(all.begin(), all.end(), [&](const PortSettings &earlier) {
+    return earlier.group == settings.group;
   });
-  if (!usable) {
-    std::fprintf(stderr, "Port name \"%s\" can't name a group of settings\n", id->c_str());
-    return nullptr;
+  if (same != all.end()) {
+    *same = std::move(settings);
+  } else {
+    all.push_back(std::move(settings));
   }
-  return id->c_str();
+}
+
+void add_waiting(const std::string &file, PortSettings settings, std::function<void()> ended) {
+  const std::lock_guard lock(waiting_lock);
+  Waiting &all = waiting[file];
+  put(all.settings, std::move(settings));
+  if (ended) {
+    all.ended.push_back(std::move(ended));
+  }
+}
+
+Waiting take_waiting(const std::string &file) {
+  const std::lock_guard lock(waiting_lock);
+  auto taken = waiting.extract(file);
+  return taken ? std::move(taken.mapped()) : Waiting();
+}
+
+using Calls = std::vector<std::function<void()>>;
+
+gboolean make_calls(gpointer calls) {
+  for (const auto &call : *static_cast<Calls *>(calls)) {
+    if (call) {
+      call();
+    }
+  }
+  return G_SOURCE_REMOVE;
+}
+
+void call_from_main_loop(Calls calls) {
+  if (!calls.empty()) {
+    g_idle_add_full(G_PRIORITY_DEFAULT, make_calls, new Calls(std::move(calls)),
+                    [](gpointer made) { delete static_cast<Calls *>(made); });
+  }
+}
+
+std::vector<std::string> files_waited_for() {
+  const std::lock_guard lock(waiting_lock);
+  std::vector<std::string> files;
+  files.reserve(waiting.size());
+  for (const auto &[file, settings] : waiting) {
+    files.push_back(file);
+  }
+  return files;
+}
+
+bool is_waited_for(const std::string &file) {
+  const std::lock_guard lock(waiting_lock);
+  return waiting.contains(file);
 }
 
 // --- The operations, with the lock held ---
 
-bool read_configuration(const std::string &file) {
-  key_file.reset(g_key_file_new());
-  if (!g_file_test(file.c_str(), G_FILE_TEST_EXISTS)) {
+// Only a file that is known not to exist reads as empty: an error must not make good settings give
+// way to defaults.
+bool load(GKeyFile *into, const std::string &file, GError **error) {
+  Error reason;
+  std::string path = file;
+  const RegularFile opened = open_trusted_file(path, reason.out());
+  if (reason.matches(G_FILE_ERROR, G_FILE_ERROR_NOENT)) {
     return true;
   }
+  const auto text = opened.fd ? read_file(opened, kNoSizeLimit, reason.out()) : std::nullopt;
   // Translations are kept too: a key of another's in a language of its own is not ours to lose.
   constexpr auto keep_all =
       static_cast<GKeyFileFlags>(G_KEY_FILE_KEEP_COMMENTS | G_KEY_FILE_KEEP_TRANSLATIONS);
+  if (!text ||
+      !g_key_file_load_from_data(into, text->data(), text->size(), keep_all, reason.out())) {
+    g_propagate_prefixed_error(error, g_error_copy(reason.get()), "%s: ", file.c_str());
+    return false;
+  }
+  return true;
+}
+
+bool read_configuration(const std::string &file) {
+  key_file.reset(g_key_file_new());
+  key_file_path = file;
   Error error;
-  if (!g_key_file_load_from_file(key_file.get(), file.c_str(), keep_all, error.out())) {
+  if (!load(key_file.get(), file, error.out())) {
     std::fprintf(stderr, "Could not read key file: %s\n", error.message());
     key_file.reset();
     return false;
@@ -275,8 +143,8 @@ bool write_configuration(const std::string &file) {
 }
 
 void set_conf_vals(IOPort *ioport) {
-  if (const char *group = group_of(ioport)) {
-    write_group(ioport, group);
+  if (const auto settings = port_settings_take(ioport)) {
+    port_settings_store(*settings, key_file.get());
   }
 }
 
@@ -296,10 +164,35 @@ void change_and_write(const std::string &file, Change change) {
   }
 }
 
+// The same with what waits to be stored in the file, which is older than what `change` brings.
+template <typename Change>
+void store(const std::string &file, Change change) {
+  Waiting earlier = take_waiting(file);
+  change_and_write(file, [&] {
+    for (const PortSettings &settings : earlier.settings) {
+      port_settings_store(settings, key_file.get());
+    }
+    change();
+  });
+  call_from_main_loop(std::move(earlier.ended));
+}
+
+// On the thread of the storage writer.
+void store_waiting() {
+  const std::lock_guard lock(settings_lock);
+  for (const std::string &file : files_waited_for()) {
+    store(file, [] {});
+  }
+}
+
 }  // namespace
 
 bool param_read_configuration(const std::string &file) {
   const std::lock_guard lock(settings_lock);
+  key_file.reset();
+  if (is_waited_for(file)) {
+    store(file, [] {});
+  }
   return read_configuration(file);
 }
 
@@ -317,16 +210,7 @@ void param_free_configuration() {
 bool param_get_conf_vals(IOPort *ioport) {
   const std::lock_guard lock(settings_lock);
   g_return_val_if_fail(key_file != NULL, false);
-  const char *group = group_of(ioport);
-  if (!group || !g_key_file_has_group(key_file.get(), group)) {
-    return false;
-  }
-  GroupReader reader(ioport, group);
-  reader.read();
-  if (reader.error()) {
-    std::fprintf(stderr, "Error parsing param file: %s\n", reader.error().message());
-  }
-  return !reader.error();
+  return port_settings_apply(key_file.get(), key_file_path, ioport);
 }
 
 void param_set_conf_vals(IOPort *ioport) {
@@ -337,7 +221,17 @@ void param_set_conf_vals(IOPort *ioport) {
 
 void param_save_for_port(IOPort *ioport, const std::string &file) {
   const std::lock_guard lock(settings_lock);
-  change_and_write(file, [&] { set_conf_vals(ioport); });
+  store(file, [&] { set_conf_vals(ioport); });
+}
+
+void param_request_save(IOPort *ioport, const std::string &file, std::function<void()> ended) {
+  auto settings = port_settings_take(ioport);
+  if (!settings) {
+    call_from_main_loop({std::move(ended)});
+    return;
+  }
+  add_waiting(file, std::move(*settings), std::move(ended));
+  storage_writer_ask(store_waiting);
 }
 
 void param_save_all(const std::string &file) {
@@ -351,25 +245,9 @@ void param_save_all(const std::string &file) {
     return;
   }
   const std::lock_guard lock(settings_lock);
-  change_and_write(file, [&] {
+  store(file, [&] {
     for (const auto &ioport : ports) {
       set_conf_vals(ioport.get());
     }
   });
-}
-
-void param_chown_to_service_user(const std::string &file) {
-  const passwd *user = getpwnam(kServiceAccount);
-  if (!user) {
-    log_warning("Failed to get uid");
-    return;
-  }
-  const group *service_group = getgrnam(kServiceAccount);
-  if (!service_group) {
-    log_warning("Failed to get gid");
-    return;
-  }
-  if (chown(file.c_str(), user->pw_uid, service_group->gr_gid) != 0) {
-    log_warning("chown failed on file '%s': (%d) %s", file.c_str(), errno, g_strerror(errno));
-  }
 }

@@ -5,14 +5,17 @@
 // taken first. Main thread.
 #pragma once
 
+#include <functional>
 #include <string>
 
 struct IOPort;
 
 inline constexpr const char *kSettingsFile = "/etc/portd/portd.conf";
 
-// Replaces the key file in memory by the contents of `file`; a missing file reads as empty. False,
-// with a message on standard error and no key file held, when the file can't be read.
+// Replaces the key file in memory by the contents of `file`, with every save that was asked for; a
+// missing file reads as empty. False, with a message on standard error and no key file held, when
+// the file can't be read, or when nobody can tell whether it exists. Only a regular file is read,
+// and a link to one only where root or the daemon's own account owns the link.
 bool param_read_configuration(const std::string &file);
 // Writes the key file in memory. False, with a message on standard error, when it can't be stored;
 // what the file held before is then untouched.
@@ -27,10 +30,19 @@ bool param_get_conf_vals(IOPort *ioport);
 void param_set_conf_vals(IOPort *ioport);
 
 // Stores the settings of one port: into the key file in memory when one is held, else by reading,
-// changing and replacing the file. What goes wrong is said on standard error.
+// changing and replacing the file. What goes wrong is said on standard error. Waits for storage.
 void param_save_for_port(IOPort *ioport, const std::string &file);
-// The same for every port in service whose number is below their count, in one go.
+// Has the storage writer do the same with the settings that the port has now, and does not wait.
+// Requests that wait share one read and one write, and of several for one port the last one counts.
+// `ended`, if any, is called from the main loop when the save has ended, well or not.
+void param_request_save(IOPort *ioport, const std::string &file,
+                        std::function<void()> ended = nullptr);
+// The same for every port in service whose number is below their count, in one go. Waits for
+// storage.
 void param_save_all(const std::string &file);
 
-// Gives the file to the account that the daemon runs under after start-up.
+// Gives the file to the account that the daemon runs under after start-up. Where root made the file
+// a link, that is the file that it names; nobody else's link is followed.
 void param_chown_to_service_user(const std::string &file);
+// Removes what saves that were cut off, by a power failure say, have left beside the file.
+void param_remove_unfinished(const std::string &file);

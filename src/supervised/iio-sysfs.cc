@@ -1,7 +1,6 @@
 #include "supervised/iio-sysfs.h"
 
 #include <fcntl.h>
-#include <glib/gstdio.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -9,6 +8,7 @@
 
 #include "base/glib-ptr.h"
 #include "base/log.h"
+#include "base/unique-fd.h"
 
 namespace {
 
@@ -57,10 +57,17 @@ std::string iio_path(const std::string &absolute) {
 }
 
 std::optional<std::string> sysfs_read(const std::string &path) {
-  char *contents = nullptr;
   Error error;
-  if (!g_file_get_contents(path.c_str(), &contents, nullptr, error.out())) {
+  auto text = sysfs_read(path, error.out());
+  if (!text) {
     log_critical("Failed to read sysfs path '%s': %s", path.c_str(), error.message());
+  }
+  return text;
+}
+
+std::optional<std::string> sysfs_read(const std::string &path, GError **error) {
+  char *contents = nullptr;
+  if (!g_file_get_contents(path.c_str(), &contents, nullptr, error)) {
     return std::nullopt;
   }
   const GCharPtr owner(contents);
@@ -68,24 +75,24 @@ std::optional<std::string> sysfs_read(const std::string &path) {
   return std::string(text.substr(0, text.rfind('\n')));
 }
 
-bool sysfs_write(const std::string &path, const std::string &text) {
-  const int fd = open(path.c_str(), O_WRONLY | O_TRUNC | O_CLOEXEC);
-  if (fd < 0) {
+SysfsWrite sysfs_write(const std::string &path, const std::string &text) {
+  UniqueFd file(open(path.c_str(), O_WRONLY | O_TRUNC | O_CLOEXEC));
+  if (!file) {
     log_critical("Failed to open sysfs path '%s': %s", path.c_str(), g_strerror(errno));
-    return false;
+    return SysfsWrite::not_opened;
   }
-  const bool written = write(fd, text.data(), text.size()) >= 0;
+  const bool written = write(file.get(), text.data(), text.size()) >= 0;
   if (!written) {
     log_critical("Failed to write sysfs path '%s': %s", path.c_str(), g_strerror(errno));
   }
-  Error error;
-  if (!g_close(fd, error.out())) {
-    log_critical("Failed to close sysfs path '%s': %s", path.c_str(), error.message());
+  if (close(file.release()) != 0) {
+    log_critical("Failed to close sysfs path '%s': %s", path.c_str(), g_strerror(errno));
+    return SysfsWrite::not_closed;
   }
-  return written;
+  return written ? SysfsWrite::done : SysfsWrite::not_written;
 }
 
-bool sysfs_write_number(const std::string &path, int number) {
+SysfsWrite sysfs_write_number(const std::string &path, int number) {
   return sysfs_write(path, std::to_string(number).substr(0, 1));
 }
 
@@ -119,4 +126,9 @@ int iio_find_number(const std::string &name, int kind) {
     }
   }
   return -1;
+}
+
+bool iio_is_device(int number, const std::string &name) {
+  Error ignored;
+  return sysfs_read(iio_folder(IIO_KIND_DEVICE, number) + "name", ignored.out()) == name;
 }

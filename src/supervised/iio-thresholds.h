@@ -4,6 +4,7 @@
 
 #include <cstdint>
 #include <string>
+#include <vector>
 
 #include "base/unique-fd.h"
 #include "port/supervised-range.h"
@@ -37,10 +38,14 @@ struct ThresholdFiles {
   bool one_side = false;  // the events of one side alone were enabled last
 };
 
-// Opens the files, whose paths begin with `prefix`.
+// The paths of all files that there may be. They begin with `prefix`.
+std::vector<std::string> threshold_paths(const std::string &prefix);
+// Opens the files. One that is there and can't be opened is logged.
 ThresholdFiles open_threshold_files(const std::string &prefix);
-// Writes a decimal number. What goes wrong in this and the following is logged.
-void write_threshold(const UniqueFd &file, std::int32_t value);
-// Sets the thresholds of a plan and enables their events.
-void apply_thresholds(ThresholdFiles *files, const ThresholdPlan &plan);
+// Whether thresholds can be set at all: there is one of a value and one that enables it.
+bool has_thresholds(const ThresholdFiles &files);
+// Writes a decimal number. False: there is no such file, or it failed, which is logged.
+bool write_threshold(const UniqueFd &file, std::int32_t value);
+// Sets the thresholds of a plan and enables their events. False: not all of them.
+bool apply_thresholds(ThresholdFiles *files, const ThresholdPlan &plan);
 void disable_thresholds(ThresholdFiles *files);

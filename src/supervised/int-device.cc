@@ -32,7 +32,7 @@ IntDevicePtr find_device(const std::string &path) {
   std::erase_if(devices, [](const auto &device) { return device.expired(); });
   for (const auto &entry : devices) {
     IntDevicePtr device = entry.lock();
-    if (device && device->path == path && device->events) {
+    if (device && device->path == path && !device->gone) {
       return device;
     }
   }
@@ -68,8 +68,9 @@ auto find_watched(const IOPort *port) {
                       [&](const Watched &watched) { return watched.listener.port == port; });
 }
 
-// Takes the device out of service; its ports open it anew when they find it again.
-std::vector<IntListener> retire(IntDevice *device) {
+// Ends the watch. The descriptor stays: its ports watch it again, or open the device anew when it
+// is gone.
+std::vector<IntListener> end_watch(IntDevice *device) {
   std::vector<IntListener> listeners;
   std::erase_if(watched_ports, [&](const Watched &watched) {
     if (watched.device == device) {
@@ -80,7 +81,6 @@ std::vector<IntListener> retire(IntDevice *device) {
   device->users = 0;
   device->watch.reset();
   device->check.reset();
-  device->events.reset();
   return listeners;
 }
 
@@ -126,8 +126,9 @@ Call take_event(IntDevice *device, GIOCondition condition, std::vector<IntListen
     errno = ENODEV;
   }
   if (result == Read::failed) {
+    device->gone = errno == ENODEV;
     log_critical("read Error: %s", g_strerror(errno));
-    *listeners = retire(device);
+    *listeners = end_watch(device);
     return &IntListener::lost;
   }
   if (result == Read::event) {
@@ -175,7 +176,7 @@ void int_device_watch(const IntDevicePtr &device, const IntListener &listener) {
     watched_ports.push_back({listener, device.get()});
     ++device->users;
   }
-  if (!device->watch && device->events) {
+  if (!device->watch) {
     device->watch = Source(g_unix_fd_add(device->events.get(), G_IO_IN, on_event, device.get()));
     device->check = Source(g_timeout_add_seconds(kCheckInterval, check_device, device.get()));
   }

@@ -15,27 +15,28 @@
 
 struct IntDevice {
   std::string path;  // of the character device
-  UniqueFd events;   // none once the device has failed
-  Source watch;      // of the events, while a port is watched
-  Source check;      // whether the device is still there, at the same time
+  UniqueFd events;
+  bool gone = false;  // what `events` belongs to is no longer there
+  Source watch;       // of the events, while a port is watched
+  Source check;       // whether the device is still there, at the same time
   unsigned int users = 0;
 };
 // Held by every port that is set up on the device; the last one to go closes the descriptor.
 using IntDevicePtr = std::shared_ptr<IntDevice>;
 
-// The device that the ports on that path share, opened for the first of them. None, with a message,
-// when it can't be had.
+// The device that the ports on that path share, opened for the first of them; one that is gone is
+// opened anew. None, with a message, when it can't be had.
 IntDevicePtr int_device_get(const std::string &path);
 
 // What a port on a device is told.
 struct IntListener {
   IOPort *port;
   std::uint32_t channel;
-  // Its channel has an event: no further ones, please. Called under the lock.
+  // Its channel has an event: disable further events. Called under the lock.
   void (*disable)(IOPort *port);
   // After that, once for each event.
   void (*handle)(IOPort *port);
-  // The device has failed, and the port is no longer watched.
+  // The device can't be read or is gone, and the port is no longer watched.
   void (*lost)(IOPort *port);
 };
 

@@ -3,33 +3,30 @@
 #include <glib-unix.h>
 #include <unistd.h>
 
+#include <array>
 #include <atomic>
 #include <cerrno>
 #include <string>
 #include <string_view>
+#include <utility>
+#include <vector>
 
 #include "base/glib-ptr.h"
 #include "base/log.h"
 #include "base/unique-fd.h"
 #include "port/port-error.h"
+#include "supervised/iio-line.h"
 #include "supervised/iio-sample.h"
 #include "supervised/iio-sysfs.h"
 #include "supervised/range-property.h"
-#include "supervised/supervised-backends.h"
-#include "supervised/supervised-data.h"
-#include "supervised/supervised-edge-watch.h"
-#include "supervised/supervised-parts.h"
-#include "supervised/supervised-pins.h"
-#include "supervised/supervised-utils.h"
 
 namespace {
 
 constexpr const char *kTimerTriggers = "/sys/kernel/config/iio/triggers/hrtimer/";
 constexpr int kFolderMode = 0775;
-constexpr guint kRecoveryInterval = 1000;  // milliseconds between two looks for a lost device
-constexpr guint kCheckInterval = 1;        // seconds between two looks whether it is lost
+constexpr guint kCheckInterval = 1;  // seconds between two looks whether the device is lost
 
-struct IioSupervisedData : SupervisedData {
+struct IioSupervisedData : IioLine {
   std::string name;     // of the device whose buffer is read
   std::string adc;      // of the device whose trigger is set
   std::string hrtimer;  // of the trigger
@@ -39,13 +36,23 @@ struct IioSupervisedData : SupervisedData {
 
   std::string dev_path;
   UniqueFd fd;
+  bool gone = false;  // what `fd` belongs to is no longer there
   IioSampleType iio_type;
   // Action threads ask for these, too.
   std::atomic<std::uint32_t> last_level = 0;
   std::atomic<bool> lost = false;  // the watch could not read a sample; until the next one
   Source device_watch;
   Source device_check;
-  Source recovery;
+
+  bool set_control_pins(IOPort *port) override;
+  bool setup_line(IOPort *port) override;
+  void set_line_watch(IOPort *port, bool on) override;
+  [[nodiscard]] const std::string &device_name() const override { return name; }
+  [[nodiscard]] bool is_gone() const override;
+  [[nodiscard]] std::string node_of(int device) const override;
+  [[nodiscard]] std::vector<std::string> attributes_of(int device) const override;
+  bool connect(IOPort *port) override;
+  bool resume(IOPort *port) override;
 };
 
 PendingRange pending_range;
@@ -69,6 +76,14 @@ void make_timer_trigger(const std::string &name) {
   }
 }
 
+std::string trigger_frequency(int trigger) {
+  return iio_folder(IIO_KIND_TRIGGER, trigger) + "sampling_frequency";
+}
+
+std::string current_trigger(int adc) {
+  return iio_folder(IIO_KIND_DEVICE, adc) + "trigger/current_trigger";
+}
+
 // The timer's trigger at its frequency, for the converter.
 bool setup_trigger(const IioSupervisedData *data, int adc) {
   if (!data->hrtimer.empty()) {
@@ -79,8 +94,8 @@ bool setup_trigger(const IioSupervisedData *data, int adc) {
     log_critical("Failed to find trigger");
     return false;
   }
-  sysfs_write(iio_folder(IIO_KIND_TRIGGER, trigger) + "sampling_frequency", data->freq);
-  const std::string current = iio_folder(IIO_KIND_DEVICE, adc) + "trigger/current_trigger";
+  sysfs_write(trigger_frequency(trigger), data->freq);
+  const std::string current = current_trigger(adc);
   if (sysfs_read(current) != data->hrtimer) {
     sysfs_write(current, data->hrtimer);
   }
@@ -116,22 +131,28 @@ bool read_sample_type(IioSupervisedData *data, const std::string &path) {
   return true;
 }
 
+std::string buffer_switch(int device) {
+  return iio_folder(IIO_KIND_DEVICE, device) + "buffer/enable";
+}
+
 void enable_buffer(int device, const std::string &element) {
-  const std::string enable = iio_folder(IIO_KIND_DEVICE, device) + "buffer/enable";
+  const std::string enable = buffer_switch(device);
   sysfs_write_number(enable, 0);
   sysfs_write_number(element + "_en", 1);
   sysfs_write_number(enable, 1);
 }
 
-// Reads never block: a spurious wake-up must not stop the daemon. The device allows one user at a
-// time, so an earlier descriptor goes first.
+// Reads never block: a spurious wake-up must not stop the daemon. What was open before stays when
+// the device can't be opened.
 bool open_device(IioSupervisedData *data) {
-  data->fd.reset();
-  data->fd.reset(open(data->dev_path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
-  if (!data->fd) {
+  UniqueFd fresh(open(data->dev_path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+  if (!fresh) {
     log_critical("Failed to open device: %s", g_strerror(errno));
+    return false;
   }
-  return static_cast<bool>(data->fd);
+  data->fd = std::move(fresh);
+  data->gone = false;
+  return true;
 }
 
 bool iio_setup_sysfs(IioSupervisedData *data) {
@@ -141,36 +162,26 @@ bool iio_setup_sysfs(IioSupervisedData *data) {
     log_critical("Failed to find device name: %d %d", device, adc);
     return false;
   }
-  data->dev_path = iio_path("/dev/") + iio_entry(IIO_KIND_DEVICE, device);
+  data->dev_path = data->node_of(device);
   if (!setup_trigger(data, adc)) {
     return false;
   }
   const std::string element = scan_element(data, device);
   // A device that is back is the one that passed this before.
-  if (!data->lost && !read_sample_type(data, element + "_type")) {
+  if (data->iio_type.bytes == 0 && !read_sample_type(data, element + "_type")) {
     return false;
   }
   enable_buffer(device, element);
   return open_device(data);
 }
 
-bool iio_setup_line(IOPort *port) {
-  IioSupervisedData *data = data_of(port);
-  data->lost = false;
-  data->last_level = 0;
-  if (iio_setup_sysfs(data)) {
-    return true;
-  }
-  log_critical("Failed to setup iio device.");
-  return false;
-}
-
 // --- Samples ---
 
-enum class Read { sample, nothing, failed, gone };
+enum class Read { sample, nothing, cut_off, failed };
 
-Read failed_read(IioSupervisedData *data, int code, Read result, GError **error) {
+Read failed_read(IioSupervisedData *data, int code, GError **error, Read result = Read::failed) {
   data->lost = true;
+  data->gone = data->gone || code == ENODEV;
   const char *reason = g_strerror(code);
   log_critical("read Error: %s", reason);
   g_set_error_literal(error, io_supervised_error_quark(), IO_SUPERVISED_ERROR_GENERIC, reason);
@@ -184,10 +195,10 @@ Read read_sample(IioSupervisedData *data, GError **error) {
     return Read::nothing;
   }
   if (length <= 0) {
-    return failed_read(data, length == 0 ? ENODEV : errno, Read::gone, error);
+    return failed_read(data, length == 0 ? ENODEV : errno, error);
   }
   if (static_cast<std::size_t>(length) != data->iio_type.bytes) {
-    return failed_read(data, EIO, Read::failed, error);
+    return failed_read(data, EIO, error, Read::cut_off);
   }
   data->last_level = iio_decode_sample(data->iio_type, sample, data->shift);
   data->lost = false;
@@ -208,24 +219,24 @@ bool get_supervised_readout(IOPort *port, SupervisedRangeState *state, std::uint
 
 // --- Device watch ---
 
-gboolean recover(gpointer user_data);
-
-// A device that is gone would wake the main loop without end. It is looked for instead.
-void lose_device(IOPort *port, IioSupervisedData *data) {
-  data->lost = true;
+void end_watch(IioSupervisedData *data) {
   data->device_watch.reset();
   data->device_check.reset();
-  data->fd.reset();
-  data->recovery = Source(g_timeout_add(kRecoveryInterval, recover, port));
+}
+
+// A device that can't be read would wake the main loop without end. It is tried again instead.
+void lose_device(IOPort *port, IioSupervisedData *data) {
+  data->lost = true;
+  end_watch(data);
+  iio_try_later(port);
 }
 
 gboolean on_sample(gint /*fd*/, GIOCondition condition, gpointer user_data) {
   auto *port = static_cast<IOPort *>(user_data);
   IioSupervisedData *data = data_of(port);
   Error error;
-  const Read result = (condition & G_IO_IN) != 0
-                          ? read_sample(data, error.out())
-                          : failed_read(data, ENODEV, Read::gone, error.out());
+  const Read result = (condition & G_IO_IN) != 0 ? read_sample(data, error.out())
+                                                 : failed_read(data, ENODEV, error.out());
   if (result == Read::nothing) {
     return G_SOURCE_CONTINUE;
   }
@@ -236,7 +247,7 @@ gboolean on_sample(gint /*fd*/, GIOCondition condition, gpointer user_data) {
   if (error) {
     log_critical("Readout failed: %s", error.message());
   }
-  if (result == Read::gone) {
+  if (result == Read::failed) {
     lose_device(port, data);
   }
   supervised_report_state(port, state);
@@ -248,63 +259,26 @@ gboolean check_device(gpointer user_data) {
   return on_sample(-1, G_IO_IN, user_data);
 }
 
+// The kernel keeps the oldest samples when its buffer is full: what was queued while nobody watched
+// says nothing of the line as it is now. False: the device can't be read.
+bool drop_queued_samples(IioSupervisedData *data) {
+  constexpr int most = 64;  // a device that is faster than this is drained enough
+  std::array<std::uint8_t, 4096> queued{};
+  ssize_t length = 1;
+  for (int i = 0; i < most && length > 0; ++i) {
+    length = read(data->fd.get(), queued.data(), queued.size());
+  }
+  const bool readable = length > 0 || (length < 0 && (errno == EAGAIN || errno == EINTR));
+  data->gone = length == 0 || (!readable && errno == ENODEV);
+  return readable;
+}
+
 void watch_device(IOPort *port, IioSupervisedData *data) {
-  data->recovery.reset();
   data->device_check = Source(g_timeout_add_seconds(kCheckInterval, check_device, port));
   data->device_watch = Source(g_unix_fd_add(data->fd.get(), G_IO_IN, on_sample, port));
 }
 
-// Only a device that is there again is worth the messages of a set-up.
-gboolean recover(gpointer user_data) {
-  auto *port = static_cast<IOPort *>(user_data);
-  IioSupervisedData *data = data_of(port);
-  if (iio_find_number(data->name, IIO_KIND_DEVICE) >= 0 && iio_setup_sysfs(data)) {
-    watch_device(port, data);
-  }
-  return G_SOURCE_CONTINUE;
-}
-
-void set_device_watch(IOPort *port, bool on) {
-  IioSupervisedData *data = data_of(port);
-  if (!on) {
-    data->device_watch.reset();
-    data->device_check.reset();
-    data->recovery.reset();
-    data->lost = false;
-  } else if (!data->device_watch && !data->recovery) {
-    data->last_state = SUPERVISED_STATE_UNDEFINED;
-    if (data->fd) {
-      watch_device(port, data);
-    } else {
-      lose_device(port, data);
-    }
-  }
-}
-
-constexpr SupervisedParts kParts = {
-    .sio_ctrl_optional = false,
-    .set_control_pins = iio_set_control_pins,
-    .setup_line = iio_setup_line,
-    .set_line_watch = set_device_watch,
-};
-
-// --- Operations ---
-
-bool setup(IOPort *port, bool initial_level) {
-  return supervised_setup(port, initial_level, kParts);
-}
-
-bool set_supervised(IOPort *port, bool supervised) {
-  return supervised_switch(port, supervised, kParts);
-}
-
-void start_watch(IOPort *port) {
-  supervised_switch_watch(port, io_port_supervised_input(port), kParts);
-}
-
-void set_direction(IOPort *port, bool input) {
-  (void)supervised_turn(port, input, kParts);
-}
+// --- The document ---
 
 void set_device_property(IioSupervisedData *data, std::string_view key, const char *value) {
   if (key == "name") {
@@ -323,7 +297,7 @@ void set_device_property(IioSupervisedData *data, std::string_view key, const ch
 }
 
 void set_property(IOPort *port, const char *section, const char *key, const char *value) {
-  auto *data = io_port_make_backend_data<IioSupervisedData>(port);
+  IioSupervisedData *data = data_of(port);
   if (supervised_set_pin_property(port, section, key, value)) {
     return;
   }
@@ -334,28 +308,79 @@ void set_property(IOPort *port, const char *section, const char *key, const char
   }
 }
 
-void free_data(IOPort *port) {
-  io_port_set_backend_data(port, nullptr);
+}  // namespace
+
+// --- What differs from other lines ---
+
+bool IioSupervisedData::set_control_pins(IOPort *port) {
+  return iio_set_control_pins(port);
 }
 
-constexpr PortFunctions kFunctions = {
-    .setup = setup,
+// The device allows one user at a time, so an earlier descriptor goes first.
+bool IioSupervisedData::setup_line(IOPort * /*port*/) {
+  fd.reset();
+  iio_type = {};
+  refusal_logged = false;
+  lost = false;
+  last_level = 0;
+  if (iio_setup_sysfs(this)) {
+    return true;
+  }
+  log_critical("Failed to setup iio device.");
+  return false;
+}
+
+// Switched on again it begins anew: what could not be had before may be there now.
+void IioSupervisedData::set_line_watch(IOPort *port, bool on) {
+  if (!on) {
+    end_watch(this);
+    retry.stop();
+    lost = false;
+  } else if (!device_watch) {
+    last_state = SUPERVISED_STATE_UNDEFINED;
+    lost = !iio_try_now(port) || lost;
+  }
+}
+
+bool IioSupervisedData::is_gone() const {
+  return gone || !fd;
+}
+
+std::string IioSupervisedData::node_of(int device) const {
+  return iio_path("/dev/") + iio_entry(IIO_KIND_DEVICE, device);
+}
+
+std::vector<std::string> IioSupervisedData::attributes_of(int device) const {
+  return {buffer_switch(device), scan_element(this, device) + "_en",
+          current_trigger(iio_find_number(adc, IIO_KIND_DEVICE)),
+          trigger_frequency(iio_find_number(hrtimer, IIO_KIND_TRIGGER))};
+}
+
+bool IioSupervisedData::connect(IOPort * /*port*/) {
+  return iio_setup_sysfs(this);
+}
+
+// A device that still can't be read is not worth another message; one that could be read last gets
+// one from its watch.
+bool IioSupervisedData::resume(IOPort *port) {
+  if (!drop_queued_samples(this) && lost) {
+    return false;
+  }
+  watch_device(port, this);
+  return true;
+}
+
+extern constexpr PortFunctions kIioBackend = {
+    .make_record = make_backend_record<IioSupervisedData>,
+    .setup = supervised_setup,
     .is_supervisable = supervised_is_supervisable,
-    .set_supervised = set_supervised,
+    .set_supervised = supervised_set_supervised,
     .get_supervised_ranges = supervised_ranges_get,
     .set_supervised_ranges = supervised_ranges_set,
     .get_supervised_readout = get_supervised_readout,
     .get_state = supervised_pin_level,
     .set_state = supervised_set_state,
-    .start_watch = start_watch,
-    .set_direction = set_direction,
+    .start_watch = supervised_update_watch,
+    .set_direction = supervised_set_direction,
     .set_property = set_property,
-    .free = free_data,
 };
-
-}  // namespace
-
-const PortFunctions *supervised_iio_backend_functions(IOPort *port) {
-  io_port_make_backend_data<IioSupervisedData>(port);
-  return &kFunctions;
-}

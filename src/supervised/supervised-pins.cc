@@ -1,37 +1,42 @@
 #include "supervised/supervised-pins.h"
 
-#include <cstring>
+#include <cerrno>
 #include <string_view>
 
 #include "base/log.h"
-#include "supervised/supervised-data.h"
 
 namespace {
 
-GpioPinPtr *pin_of_section(SupervisedData *data, std::string_view section) {
+constexpr std::uint32_t kUnknownLevel = 2;
+
+SupervisedPins *pins_of(IOPort *port) {
+  return static_cast<SupervisedPins *>(io_port_backend_data(port));
+}
+
+GpioPinPtr *pin_of_section(SupervisedPins *pins, std::string_view section) {
   if (section == "io_ctrl") {
-    return &data->io_ctrl;
+    return &pins->io_ctrl;
   }
   if (section == "sio_ctrl") {
-    return &data->sio_ctrl;
+    return &pins->sio_ctrl;
   }
   if (section == "input") {
-    return &data->input;
+    return &pins->input;
   }
-  return section == "output" ? &data->output : nullptr;
+  return section == "output" ? &pins->output : nullptr;
 }
 
-const char *alias_of(const GpioPin &pin) {
-  return pin.alias ? pin.alias->c_str() : "(null)";
-}
-
-void request_pin(const GpioPinPtr &pin, bool is_input, bool level) {
+// A port lives on without a pin that can't be had. The first message says at what it failed, the
+// second whose it is.
+void request_pin(IOPort *port, const GpioPinPtr &pin, const char *role, bool is_input, bool level) {
   if (!pin) {
     return;
   }
-  log_info("Init pin: %s", alias_of(*pin));
-  // Why it failed is in the log; the port does without the pin.
-  (void)libugpio_request_gpio_pin(pin.get(), is_input, level);
+  log_info("Init pin: %s", libugpio_alias_text(pin.get()));
+  if (!libugpio_request_gpio_pin(pin.get(), is_input, level, G_LOG_LEVEL_CRITICAL)) {
+    log_warning("Port %s has to do without its %s pin: %s", io_port_describe(port), role,
+                g_strerror(errno));
+  }
 }
 
 // The line keeps the direction that it has: the boot loader has set it.
@@ -40,11 +45,11 @@ bool request_sio_ctrl(GpioPin &pin) {
   pin.handle = pin.alias ? ugpio_request_named(pin.alias->c_str())
                          : ugpio_request(static_cast<unsigned int>(pin.pin), "sioctrl");
   if (!pin.handle) {
-    log_critical("Request for gpio pin %s failed.", alias_of(pin));
+    log_critical("Request for gpio pin %s failed.", libugpio_alias_text(&pin));
     return false;
   }
   if (ugpio_full_open(pin.handle) == -1) {
-    log_critical("Failed to open gpio pin %s\n", alias_of(pin));
+    log_critical("Failed to open gpio pin %s\n", libugpio_alias_text(&pin));
     return false;
   }
   if (ugpio_set_activelow(pin.handle, pin.inverted > 0 ? 1 : 0) != 0) {
@@ -77,11 +82,20 @@ bool has_output_side(IOPort *port) {
   return io_port_get_type(port) != PORT_INPUT;
 }
 
+int read_pin(IOPort *port) {
+  SupervisedPins *pins = pins_of(port);
+  if (io_port_input(port)) {
+    return pins->edges.read(pins->input.get());
+  }
+  const std::lock_guard guard(pins->pins_lock);
+  return libugpio_get_gpio_pin(pins->output.get());
+}
+
 }  // namespace
 
 bool supervised_set_pin_property(IOPort *port, const char *section, const char *key,
                                  const char *value) {
-  GpioPinPtr *pin = pin_of_section(supervised_data(port), section);
+  GpioPinPtr *pin = pin_of_section(pins_of(port), section);
   if (!pin) {
     return false;
   }
@@ -90,9 +104,9 @@ bool supervised_set_pin_property(IOPort *port, const char *section, const char *
 }
 
 bool supervised_check_pins(IOPort *port) {
-  const SupervisedData *data = supervised_data(port);
-  const bool input = data->input != nullptr;
-  const bool output = data->output != nullptr;
+  const SupervisedPins *pins = pins_of(port);
+  const bool input = pins->input != nullptr;
+  const bool output = pins->output != nullptr;
   if (io_port_get_type(port) == PORT_CONFIGURABLE) {
     if (!input || !output) {
       log_critical("Supervised IO port should have both 'input' and 'output' pins.");
@@ -106,45 +120,45 @@ bool supervised_check_pins(IOPort *port) {
 }
 
 void supervised_request_pins(IOPort *port, bool initial_level) {
-  const SupervisedData *data = supervised_data(port);
+  const SupervisedPins *pins = pins_of(port);
   if (io_port_get_type(port) != PORT_OUTPUT) {
-    request_pin(data->input, true, false);
+    request_pin(port, pins->input, "input", true, false);
   }
   if (has_output_side(port)) {
-    request_pin(data->output, false, !io_port_input(port) && initial_level);
+    request_pin(port, pins->output, "output", false, !io_port_input(port) && initial_level);
   }
 }
 
 bool supervised_request_control_pins(IOPort *port, bool sio_ctrl_optional) {
-  SupervisedData *data = supervised_data(port);
+  SupervisedPins *pins = pins_of(port);
   const bool input = io_port_input(port);
-  if (data->io_ctrl) {
-    request_pin(data->io_ctrl, false, input);
+  if (pins->io_ctrl) {
+    request_pin(port, pins->io_ctrl, "io_ctrl", false, input);
   } else {
     log_warning("Port %s has no io_ctrl pin", io_port_describe(port));
   }
-  if (!data->sio_ctrl) {
+  if (!pins->sio_ctrl) {
     if (!sio_ctrl_optional) {
       log_critical("Port %s has no sio_ctrl pin", io_port_describe(port));
     }
     return sio_ctrl_optional;
   }
-  return request_sio_ctrl(*data->sio_ctrl);
+  return request_sio_ctrl(*pins->sio_ctrl);
 }
 
 bool supervised_drive_control_pins(IOPort *port, ControlLevels levels) {
-  SupervisedData *data = supervised_data(port);
-  const std::lock_guard guard(data->pins_lock);
-  if (!drive(data->io_ctrl, levels.io_ctrl)) {
+  SupervisedPins *pins = pins_of(port);
+  const std::lock_guard guard(pins->pins_lock);
+  if (!drive(pins->io_ctrl, levels.io_ctrl)) {
     log_critical("Failed to set ioctrl pin");
     return false;
   }
-  if (drive(data->sio_ctrl, levels.sio_ctrl)) {
+  if (drive(pins->sio_ctrl, levels.sio_ctrl)) {
     return true;
   }
   log_critical("Failed to set sioctrl pin");
-  if (!fits(levels, data->sio_ctrl->driven_high)) {
-    (void)drive(data->io_ctrl, !levels.io_ctrl);
+  if (!fits(levels, pins->sio_ctrl->driven_high)) {
+    (void)drive(pins->io_ctrl, !levels.io_ctrl);
   }
   return false;
 }
@@ -163,23 +177,33 @@ ControlLevels supervised_control_levels(IOPort *port) {
   return {.io_ctrl = !supervised, .sio_ctrl = supervised};
 }
 
-void supervised_set_state(IOPort *port, std::int32_t level) {
-  (void)supervised_drive_output(port, level);
+std::uint32_t supervised_pin_level(IOPort *port) {
+  const int level = read_pin(port);
+  return level < 0 ? kUnknownLevel : static_cast<std::uint32_t>(level != 0);
 }
 
-bool supervised_drive_output(IOPort *port, std::int32_t level) {
-  SupervisedData *data = supervised_data(port);
-  if (!has_output_side(port) || !data->output) {
-    return false;
+void supervised_set_state(IOPort *port, std::int32_t level) {
+  SupervisedPins *pins = pins_of(port);
+  if (!has_output_side(port) || !pins->output) {
+    return;
   }
-  const std::lock_guard guard(data->pins_lock);
-  return libugpio_set_gpio_pin(data->output.get(), level);
+  const std::lock_guard guard(pins->pins_lock);
+  (void)libugpio_set_gpio_pin(pins->output.get(), level);
+}
+
+void supervised_set_edge_watch(IOPort *port, bool on) {
+  SupervisedPins *pins = pins_of(port);
+  if (!on) {
+    pins->edges.stop();
+  } else if (!pins->edges.is_on()) {
+    pins->edges.start(port, (io_port_input(port) ? pins->input : pins->output).get());
+  }
 }
 
 void supervised_close_pins(IOPort *port) {
-  SupervisedData *data = supervised_data(port);
-  const std::lock_guard guard(data->pins_lock);
-  for (const auto *pin : {&data->io_ctrl, &data->sio_ctrl, &data->input, &data->output}) {
+  SupervisedPins *pins = pins_of(port);
+  const std::lock_guard guard(pins->pins_lock);
+  for (const auto *pin : {&pins->io_ctrl, &pins->sio_ctrl, &pins->input, &pins->output}) {
     libugpio_close_gpio_pin(pin->get());
   }
 }

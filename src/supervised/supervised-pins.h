@@ -5,7 +5,22 @@
 // thread unless said otherwise.
 #pragma once
 
+#include <mutex>
+
+#include "backends/edge-watch.h"
+#include "backends/libugpio-utils.h"
 #include "port/ioport.h"
+
+struct SupervisedPins : PortBackendData {
+  GpioPinPtr io_ctrl;   // 1: the plain input path is connected
+  GpioPinPtr sio_ctrl;  // 1: the line goes to the converter
+  GpioPinPtr input;
+  GpioPinPtr output;
+  // For the pins' handles, since action threads drive the output. Nothing else is locked while it
+  // is held.
+  std::mutex pins_lock;
+  EdgeWatch edges{pins_lock, G_IO_PRI};  // of the plain pin
+};
 
 // Applies an attribute of one of the four pin sections, making the pin on its first mention. False:
 // it is another section.
@@ -38,10 +53,15 @@ void supervised_demand_input(IOPort *port, const char *file = __builtin_FILE(),
 // What they have to be by the common rule, for a port that can be an input.
 ControlLevels supervised_control_levels(IOPort *port);
 
-// For the backends' tables. Also from action threads.
+// For the backends' tables; also from action threads. The raw level of the input pin while the port
+// acts as an input, else of the output pin; 2 when it can't be read.
+std::uint32_t supervised_pin_level(IOPort *port);
+// Drives the output pin, if the port's type has an output side.
 void supervised_set_state(IOPort *port, std::int32_t level);
-// Drives the output pin if the port's type has an output side; false when it has none or it failed.
-bool supervised_drive_output(IOPort *port, std::int32_t level);
+
+// Reports every change of the plain pin from now on, or no longer. On already: nothing. A pin that
+// can't be read any more is looked at once a second until it can.
+void supervised_set_edge_watch(IOPort *port, bool on);
 
 // Gives the lines of all four pins back; the pins stay.
 void supervised_close_pins(IOPort *port);

@@ -5,25 +5,24 @@
 
 #include <cerrno>
 #include <cstdio>
-#include <map>
 #include <string>
 #include <string_view>
 
 #include "backends/spi-sample.h"
 #include "base/log.h"
 #include "base/unique-fd.h"
+#include "port/ioport.h"
 #include "port/port-error.h"
 #include "supervised/range-property.h"
-#include "supervised/supervised-backends.h"
-#include "supervised/supervised-data.h"
-#include "supervised/supervised-edge-watch.h"
-#include "supervised/supervised-parts.h"
-#include "supervised/supervised-pins.h"
-#include "supervised/supervised-utils.h"
+#include "supervised/supervised.h"
 
 namespace {
 
-struct SpiSupervisedData : SupervisedData {
+struct SpiSupervisedData : SupervisedLine {
+  bool set_control_pins(IOPort *port) override;
+  bool setup_line(IOPort *port) override;
+  void set_line_watch(IOPort *port, bool on) override { supervised_set_poll(port, on); }
+
   std::string path;          // of the spidev node
   std::uint32_t speed = 0;   // hertz; 0: the device's default
   std::uint8_t address = 0;  // tells the converter what to measure
@@ -34,13 +33,6 @@ struct SpiSupervisedData : SupervisedData {
 };
 
 PendingRange pending_range;
-
-// Freeing a port leaves its device open. The descriptor waits here for the next port on that
-// device, so that there is never more than one left over for each.
-std::map<std::string, UniqueFd> &left_open() {
-  static std::map<std::string, UniqueFd> descriptors;
-  return descriptors;
-}
 
 SpiSupervisedData *data_of(IOPort *port) {
   return static_cast<SpiSupervisedData *>(io_port_backend_data(port));
@@ -54,7 +46,6 @@ bool spi_set_control_pins(IOPort *port) {
 // --- Set-up ---
 
 bool open_device(SpiSupervisedData *data) {
-  left_open().erase(data->path);
   data->fd.reset(open(data->path.c_str(), O_RDWR | O_CLOEXEC));
   if (!data->fd) {
     log_warning("Can't open %s: %s", data->path.c_str(), g_strerror(errno));
@@ -73,29 +64,10 @@ bool open_device(SpiSupervisedData *data) {
   return true;
 }
 
-bool spi_setup_line(IOPort *port) {
-  if (open_device(data_of(port))) {
-    return true;
-  }
-  log_critical("Failed to open spi device.");
-  return false;
-}
-
-constexpr SupervisedParts kParts = {
-    .sio_ctrl_optional = false,
-    .set_control_pins = spi_set_control_pins,
-    .setup_line = spi_setup_line,
-    .set_line_watch = supervised_set_poll,
-};
-
-bool spi_setup(IOPort *port, bool initial_level) {
-  return supervised_setup(port, initial_level, kParts);
-}
-
 // --- Operations ---
 
-bool set_supervised(IOPort *port, bool supervised) {
-  return supervised_switch(port, supervised, kParts);
+bool spi_setup(IOPort *port, bool initial_level) {
+  return supervised_setup(port, initial_level);
 }
 
 // A transfer that failed costs the device until the port is set up again. Unset, with errno: it
@@ -126,10 +98,6 @@ bool get_supervised_readout(IOPort *port, SupervisedRangeState *state, std::uint
   return supervised_classify_for_port(port, *level, state, error);
 }
 
-void set_direction(IOPort *port, bool input) {
-  (void)supervised_turn(port, input, kParts);
-}
-
 void set_device_property(SpiSupervisedData *data, std::string_view section, std::string_view key,
                          const char *value) {
   unsigned int address = 0;
@@ -143,7 +111,7 @@ void set_device_property(SpiSupervisedData *data, std::string_view section, std:
 }
 
 void set_property(IOPort *port, const char *section, const char *key, const char *value) {
-  auto *data = io_port_make_backend_data<SpiSupervisedData>(port);
+  SpiSupervisedData *data = data_of(port);
   if (supervised_set_pin_property(port, section, key, value)) {
     return;
   }
@@ -154,31 +122,31 @@ void set_property(IOPort *port, const char *section, const char *key, const char
   }
 }
 
-void free_data(IOPort *port) {
-  if (SpiSupervisedData *data = data_of(port); data && data->fd) {
-    left_open()[data->path] = std::move(data->fd);
-  }
-  io_port_set_backend_data(port, nullptr);
+}  // namespace
+
+bool SpiSupervisedData::set_control_pins(IOPort *port) {
+  return spi_set_control_pins(port);
 }
 
-constexpr PortFunctions kFunctions = {
+bool SpiSupervisedData::setup_line(IOPort * /*port*/) {
+  if (open_device(this)) {
+    return true;
+  }
+  log_critical("Failed to open spi device.");
+  return false;
+}
+
+extern constexpr PortFunctions kSpiBackend = {
+    .make_record = make_backend_record<SpiSupervisedData>,
     .setup = spi_setup,
     .is_supervisable = supervised_is_supervisable,
-    .set_supervised = set_supervised,
+    .set_supervised = supervised_set_supervised,
     .get_supervised_ranges = supervised_ranges_get,
     .set_supervised_ranges = supervised_ranges_set,
     .get_supervised_readout = get_supervised_readout,
     .get_state = supervised_pin_level,
     .set_state = supervised_set_state,
     .start_watch = supervised_update_watch,
-    .set_direction = set_direction,
+    .set_direction = supervised_set_direction,
     .set_property = set_property,
-    .free = free_data,
 };
-
-}  // namespace
-
-const PortFunctions *supervised_spi_backend_functions(IOPort *port) {
-  io_port_make_backend_data<SpiSupervisedData>(port);
-  return &kFunctions;
-}

@@ -7,14 +7,13 @@
 #include <numeric>
 #include <vector>
 
-#include "backends/backends.h"
 #include "base/condition.h"
+#include "daemon/backends.h"
 #include "port/ioport.h"
 #include "port/port-listener.h"
 
 namespace {
 
-constexpr int kCheckBackend = 9;
 constexpr std::int32_t kStepMs = 5;
 constexpr int kDefaultSteps = 400;
 constexpr int kCancels = 10'000;
@@ -37,7 +36,7 @@ void on_done(int /*number*/) {
 IOPortRef make_output() {
   IOPortRef ioport(io_port_new());
   io_port_set_type(ioport.get(), PORT_OUTPUT);
-  io_port_set_backend(ioport.get(), kCheckBackend);
+  io_port_set_backend(ioport.get(), BACKEND_CHECK);
   io_port_setup(ioport.get());
   return ioport;
 }

@@ -1,5 +1,5 @@
 # shellcheck shell=bash disable=SC2034
-# Shared by the scripts of the device tier: its folders, its packages, and builds that are made once
+# Shared by the scripts of the device tier: its folders, and builds that are made once
 # for each state of what goes into them.
 
 tier=$(cd "$(dirname "${BASH_SOURCE[0]}")" && pwd)
@@ -7,11 +7,6 @@ tier=$(cd "$(dirname "${BASH_SOURCE[0]}")" && pwd)
 source "$tier/../../scripts/lib.sh"
 device=$build/device
 jobs=$(nproc)
-
-device_packages=(
-  bc bison cpio flex g++-mipsel-linux-gnu gcc-mipsel-linux-gnu libelf-dev libssl-dev
-  linux-source-6.1 make qemu-system-mips qemu-user xz-utils
-)
 
 # stamp TEXT FILE...: a short name for this text and the contents of these files.
 stamp() {
@@ -31,6 +26,50 @@ made_once() {
   mkdir -p "$folder"
   "$@" "$folder"
   printf '%s\n' "$want" >"$folder/.stamp"
+}
+
+# The folder that the clones of this machine share, or nothing: where there is none to be had, one of
+# another owner (as sudo may leave it), or where PORTD_CACHE is "no".
+shared_folder() {
+  local folder=${XDG_CACHE_HOME:-${HOME:+$HOME/.cache}}
+  [ "${PORTD_CACHE:-}" != no ] && [ -n "$folder" ] && mkdir -p "$folder/portd" 2>/dev/null &&
+    [ -O "$folder/portd" ] && [ -w "$folder/portd" ] && printf '%s' "$folder/portd"
+}
+
+# share FOLDER ENTRY: moves the folder there, in one step. Who comes second has made the same.
+share() { mv -T "$1" "$2" 2>/dev/null || rm -rf "$1"; }
+
+# Keeps those three states that were used last, and no halves that an interrupted run has left.
+prune_shared() {
+  local entry
+  find "$1" -maxdepth 1 -name '.new-*' -mmin +300 -exec rm -rf {} +
+  find "$1" -maxdepth 1 -name "$2-*" -printf '%T@ %p\n' | sort -rn | tail -n +4 | cut -d' ' -f2- |
+    while IFS= read -r entry; do rm -rf "$entry"; done
+}
+
+# shared_once NAME STAMP COMMAND...: as made_once, but made once for all clones where they share a folder.
+# $device/NAME is a link into it then.
+shared_once() {
+  local name=$1 want=$2 shared entry new
+  shared=$(shared_folder) || {
+    made_once "$@"
+    return
+  }
+  entry=$shared/$name-$want
+  if [ "$(cat "$device/$name/.stamp" 2>/dev/null)" != "$want" ]; then
+    if [ ! -e "$entry" ]; then
+      step "Making ${entry}"
+      new=$(mktemp -d "$shared/.new-XXXXXX")
+      "${@:3}" "$new"
+      printf '%s\n' "$want" >"$new/.stamp"
+      share "$new" "$entry"
+    fi
+    mkdir -p "$device"
+    rm -rf "${device:?}/$name"
+    ln -s "$entry" "$device/$name"
+  fi
+  [ ! -e "$entry" ] || touch "$entry"
+  prune_shared "$shared" "$name"
 }
 
 # The unit tests that only the guest can run, as one filter.

@@ -5,9 +5,9 @@
 
 #include <cstdlib>
 
-#include "backends/backends.h"
 #include "base/glib-ptr.h"
 #include "base/unique-fd.h"
+#include "daemon/backends.h"
 #include "port/ioport.h"
 #include "port/port-registry.h"
 #include "settings/param.h"
@@ -20,10 +20,8 @@ GLogWriterOutput drop_message(GLogLevelFlags /*level*/, const GLogField * /*fiel
 }
 
 bool owns_no_hardware(const IOPort *ioport) {
-  constexpr int virtual_backend = 0;
-  constexpr int null_backend = 8;
-  const int kind = io_port_get_backend(ioport);
-  return kind == virtual_backend || kind == null_backend || kind == kFuzzCheckBackend;
+  const BackendKind kind = io_port_get_backend(ioport);
+  return kind == BACKEND_VIRTUAL || kind == BACKEND_NULL || kind == BACKEND_CHECK;
 }
 
 }  // namespace
@@ -58,7 +56,7 @@ void fuzz_initialise() {
   backends_register();
 }
 
-void fuzz_add_port(int number, const char *id, PortType type, int backend) {
+void fuzz_add_port(int number, const char *id, PortType type, BackendKind backend) {
   const IOPortRef ioport(io_port_new());
   io_port_set_id(ioport.get(), id);
   io_port_set_type(ioport.get(), type);
@@ -66,6 +64,12 @@ void fuzz_add_port(int number, const char *id, PortType type, int backend) {
   io_port_set_backend(ioport.get(), backend);
   io_port_set_flag(ioport.get(), "ioport", "true");
   port_registry_add(ioport.get());
+}
+
+void fuzz_add_port_of_each_type() {
+  fuzz_add_port(0, "in", PORT_INPUT, BACKEND_CHECK);
+  fuzz_add_port(1, "out", PORT_OUTPUT, BACKEND_CHECK);
+  fuzz_add_port(2, "both", PORT_CONFIGURABLE, BACKEND_CHECK);
 }
 
 bool fuzz_apply_settings(const std::string &path) {

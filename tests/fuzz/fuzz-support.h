@@ -7,8 +7,6 @@
 
 #include "port/ioport.h"
 
-inline constexpr int kFuzzCheckBackend = 9;
-
 // A file in a folder of the process's own, replaced for every input.
 class InputFile {
  public:
@@ -28,7 +26,9 @@ class InputFile {
 // Backends registered, no bus to reach, log messages dropped. Once.
 void fuzz_initialise();
 // Puts a port of the device into the registry.
-void fuzz_add_port(int number, const char *id, PortType type, int backend);
+void fuzz_add_port(int number, const char *id, PortType type, BackendKind backend);
+// An input, an output and a configurable port, numbered from 0.
+void fuzz_add_port_of_each_type();
 // Reads a settings file into all ports. False: it is none.
 bool fuzz_apply_settings(const std::string &path);
 // Calls what clients can call on every port, but sets up only backends that own no hardware: a

@@ -3,11 +3,13 @@
 #include "hwdesc/hwdesc.h"
 #include "port/port-registry.h"
 
+// NOLINTNEXTLINE(readability-identifier-naming)
 extern "C" int LLVMFuzzerInitialize(int * /*argc*/, char *** /*argv*/) {
   fuzz_initialise();
   return 0;
 }
 
+// NOLINTNEXTLINE(readability-identifier-naming)
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size) {
   static InputFile file;
   file.write(data, size);

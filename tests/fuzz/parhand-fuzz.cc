@@ -57,23 +57,19 @@ std::vector<Settings> all_settings() {
   return all;
 }
 
-void add_ports() {
-  fuzz_add_port(0, "in", PORT_INPUT, kFuzzCheckBackend);
-  fuzz_add_port(1, "out", PORT_OUTPUT, kFuzzCheckBackend);
-  fuzz_add_port(2, "both", PORT_CONFIGURABLE, kFuzzCheckBackend);
-}
-
 }  // namespace
 
+// NOLINTNEXTLINE(readability-identifier-naming)
 extern "C" int LLVMFuzzerInitialize(int * /*argc*/, char *** /*argv*/) {
   fuzz_initialise();
   return 0;
 }
 
+// NOLINTNEXTLINE(readability-identifier-naming)
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size) {
   static InputFile file;
   file.write(data, size);
-  add_ports();
+  fuzz_add_port_of_each_type();
   Error ignored;
   param_import_parhand(file.path().c_str(), ignored.out());
   port_registry_assign_default_names();
@@ -82,7 +78,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
   param_save_all(file.path());
   port_registry_drop_all();
 
-  add_ports();
+  fuzz_add_port_of_each_type();
   if (!fuzz_apply_settings(file.path()) || all_settings() != imported) {
     std::abort();
   }

@@ -7,18 +7,18 @@
 #include "settings/param.h"
 #include "support/fake-supervised.h"
 
+// NOLINTNEXTLINE(readability-identifier-naming)
 extern "C" int LLVMFuzzerInitialize(int * /*argc*/, char *** /*argv*/) {
   fuzz_initialise();
   register_fake_supervised();
   return 0;
 }
 
+// NOLINTNEXTLINE(readability-identifier-naming)
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size) {
   static InputFile file;
   file.write(data, size);
-  fuzz_add_port(0, "in", PORT_INPUT, kFuzzCheckBackend);
-  fuzz_add_port(1, "out", PORT_OUTPUT, kFuzzCheckBackend);
-  fuzz_add_port(2, "both", PORT_CONFIGURABLE, kFuzzCheckBackend);
+  fuzz_add_port_of_each_type();
   fuzz_add_port(3, "line", PORT_INPUT, kFakeSupervisedKind);
   const bool readable = fuzz_apply_settings(file.path());
   port_registry_assign_default_names();

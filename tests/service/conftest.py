@@ -8,9 +8,14 @@ import pytest
 
 from converters import Converters
 from gpio_tree import GpioTree
-from harness import Device, become_root, default_binary
+from harness import Device, NoMounts, become_root, default_binary
 
-become_root()
+
+def pytest_configure() -> None:
+    try:
+        become_root()
+    except NoMounts as error:
+        raise pytest.UsageError(str(error)) from None
 
 
 def pytest_report_header() -> str:

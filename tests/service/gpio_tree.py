@@ -8,9 +8,10 @@ import threading
 from pathlib import Path
 from typing import Optional
 
-from harness import wait_for
+from harness import Device, wait_for
 
 _IN_MODIFY, _IN_CLOSE_WRITE = 0x02, 0x08
+_LIMIT = "/proc/sys/fs/inotify/max_user_instances"
 _EVENT = struct.Struct("iIII")
 _ATTRIBUTES = {"direction": "in\n", "edge": "none\n", "active_low": "0\n", "value": "0\n"}
 
@@ -32,6 +33,9 @@ class GpioTree:
         self._names: dict[int, str] = {}
         self._libc = ctypes.CDLL(None, use_errno=True)
         self._inotify = self._libc.inotify_init1(os.O_CLOEXEC | os.O_NONBLOCK)
+        if self._inotify < 0:
+            number = ctypes.get_errno()
+            raise OSError(number, f"no inotify instance: {os.strerror(number)}; {_LIMIT} is the limit")
         self._lock = threading.Lock()
         for name in ("export", "unexport"):
             (self.gpio / name).write_text("")
@@ -115,3 +119,8 @@ class GpioTree:
         unborn = self._unborn / f"gpio{text}"
         if file == "export" and unborn.exists():
             unborn.rename(self.gpio / unborn.name)
+
+
+def device_on_lines(make_device, tree: GpioTree) -> Device:
+    """A device that has the lines for its /sys."""
+    return make_device(binds={"/sys": tree.sys})

@@ -1,13 +1,16 @@
 """An older configuration tool, and what it finds on the device."""
 
+import itertools
 import re
+from contextlib import contextmanager
 from pathlib import Path
-from typing import Any
+from typing import Any, Iterator
 
 import pytest
 from gi.repository import GLib
 
-from harness import DBusError, hwdesc, port
+from harness import DBusError, hwdesc, port, wait_for
+from harness.device import SETTINGS
 
 SERVICE = "com.kelv.Configuration.Legacy.IOControl1.IOPort"
 BASE = SERVICE
@@ -37,6 +40,8 @@ WRITABLE = {
     OUTPUT: READABLE[OUTPUT],
 }
 NUMBERS = ("PulseTime", "DelayTime")
+
+GROUPS = ("in0", "out1", "io2", "virt3")
 
 
 def four_ports(*more: str) -> str:
@@ -114,16 +119,34 @@ def fails(name: str, action, *args: Any) -> str:
     return caught.value.message
 
 
-def settings_identity(device) -> tuple[int, int]:
-    """Changes with every save, since a save replaces the file."""
-    status = device.path("/etc/portd/portd.conf").stat()
-    return status.st_ino, status.st_mtime_ns
+_markers = itertools.count()
 
 
-def saves(tool: Tool, *request: Any) -> bool:
-    before = settings_identity(tool.device)
-    tool.set(*request)
-    return settings_identity(tool.device) != before
+def settle(tool: Tool) -> None:
+    """Everything that was asked for earlier is stored when the name of port 3 is."""
+    name = f"Marker {next(_markers)}"
+    tool.set(3, OUTPUT, "Name", name)
+    settings = tool.device.path(SETTINGS)
+    wait_for(lambda: settings.exists() and name in settings.read_text(), "the marker")
+
+
+@contextmanager
+def saved_groups(tool: Tool) -> Iterator[set[str]]:
+    """Collects the groups of the ports that are saved meanwhile: a save brings a port's group back
+    into a file that went away, also where nothing has changed."""
+    settle(tool)
+    tool.device.path(SETTINGS).unlink()
+    groups: set[str] = set()
+    yield groups
+    settle(tool)
+    groups |= set(re.findall(r"^\[(.*)\]$", tool.device.read_settings(), re.MULTILINE)) - {"virt3"}
+
+
+def saves(tool: Tool, number: int, *request: Any) -> bool:
+    with saved_groups(tool) as groups:
+        tool.set(number, *request)
+    assert groups <= {GROUPS[number]}
+    return bool(groups)
 
 
 def changes(device):

@@ -155,9 +155,11 @@ def add_spidev(devices: MockedDevices, name: str) -> Spidev:
     return spidev
 
 
-_CHIP_INFO, _LINE_INFO = 0x8044B401, 0xC048B402
+# The kernel has a second form of the call for a line, which libgpiod 2 makes.
+_CHIP_INFO, _LINE_INFO, _LINE_INFO_2 = 0x8044B401, 0xC048B402, 0xC100B405
 _CHIP = struct.Struct("=32s32sI")
 _LINE = struct.Struct("=II32s32s")
+_LINE_2 = struct.Struct("=32s32sIIQ176s")
 
 
 class GpioChip(UMockdev.IoctlBase):
@@ -176,7 +178,11 @@ class GpioChip(UMockdev.IoctlBase):
             info = client.get_arg().resolve(0, _LINE.size)
             offset = _LINE.unpack(info.retrieve())[0]
             info.update(0, _LINE.pack(offset, 0, self._line_names[offset], b""))
-        known = request in (_CHIP_INFO, _LINE_INFO)
+        elif request == _LINE_INFO_2:
+            info = client.get_arg().resolve(0, _LINE_2.size)
+            offset = _LINE_2.unpack(info.retrieve())[2]
+            info.update(0, _LINE_2.pack(self._line_names[offset], b"", offset, 0, 0, b""))
+        known = request in (_CHIP_INFO, _LINE_INFO, _LINE_INFO_2)
         client.complete(0 if known else -1, 0 if known else errno.EINVAL)
         return True
 
@@ -197,6 +203,13 @@ def add_gpiochip(
     on_bus = sys / "bus/gpio/devices"
     on_bus.mkdir(parents=True, exist_ok=True)
     (on_bus / name).symlink_to(f"../../..{owner}/{name}")
+    by_number = sys / f"dev/char/254:{number}"
+    if not by_number.is_symlink():
+        by_number.parent.mkdir(parents=True, exist_ok=True)
+        by_number.symlink_to(f"../..{owner}/{name}")
+    subsystem = sys / f"{owner[1:]}/{name}/subsystem"
+    subsystem.unlink()
+    subsystem.symlink_to("../../../../bus/gpio")
     in_class = sys / f"class/gpio/gpiochip{base}"
     in_class.mkdir(parents=True)
     for attribute, text in {"base": base, "label": label, "ngpio": len(line_names)}.items():

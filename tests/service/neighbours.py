@@ -5,12 +5,13 @@ import json
 import os
 import signal
 import subprocess
+import time
 from pathlib import Path
 from typing import Any, Iterator, Optional, Sequence
 
 from gi.repository import GLib
 
-from harness import Device, Pending, Signals, wait_for
+from harness import Device, Pending, Signals, scale, wait_for
 
 IOBOX = "com.kelv.IOBoxMonitor"
 STREAMER = "com.kelv.Streamer"
@@ -82,6 +83,9 @@ class Neighbour:
     def hang(self) -> None:
         self.process.send_signal(signal.SIGSTOP)
 
+    def resume(self) -> None:
+        self.process.send_signal(signal.SIGCONT)
+
     def close(self) -> None:
         self.process.kill()
         self.process.wait()
@@ -133,6 +137,13 @@ class IoBox:
         self.service.call(
             self.PATH, _MOCK, "AddMethod", "sssss", IOBOX, method, arguments, signature, code
         )
+
+    def wait_told(self, modes: set[tuple]) -> None:
+        """Returns when each of the modes was asked for, and each input's state after it."""
+        wait_for(lambda: modes <= set(self.modes()), f"the modes {modes}")
+        inputs = {(port,) for port, _level, mode in modes if mode != "out"}
+        asked = lambda: set(self.service.calls(self.PATH, "GetIOState"))  # noqa: E731
+        wait_for(lambda: inputs <= asked(), f"questions for the states of {inputs}")
 
     def report(self, number: int, word: str) -> None:
         self.service.emit(self.PATH, "IOStateChanged", "is", number, word)
@@ -191,6 +202,26 @@ def neighbourhood_fixture() -> Iterator[Neighbourhood]:
     neighbours = Neighbourhood()
     yield neighbours
     neighbours.close()
+
+
+def longest_wait(device: Device) -> float:
+    """How long a caller waited at most, of many that did nothing but read, in units of the time scale."""
+    longest = 0.0
+    for _ in range(100):
+        began = time.monotonic()
+        device.call("GetNbrPorts", timeout=60)
+        longest = max(longest, time.monotonic() - began)
+    return longest / scale()
+
+
+def threads(device: Device) -> set[str]:
+    """The names of the daemon's threads."""
+    return {comm.read_text().strip() for comm in Path(f"/proc/{device.pid}/task").glob("*/comm")}
+
+
+def arrived() -> None:
+    """Takes in the replies and signals that have come."""
+    wait_for(lambda: True, "what has arrived")
 
 
 def barrier(device: Device, changes: Signals, number: int) -> None:

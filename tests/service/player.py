@@ -3,7 +3,7 @@
 Its parameters: "objects", a map from path to (interface, properties, methods); "delay", for how many
 seconds every reading of properties takes; "error", the error that answers it; "endless", a folder
 below which every path has an object with the property "Enabled"; "ignored", methods whose calls are
-never answered.
+never answered; "silent", a folder below which no object answers for its properties.
 """
 
 import os
@@ -25,12 +25,15 @@ def load(mock, parameters):
     endless = parameters.get("endless")
     error = parameters.get("error")
     ignored = parameters.get("ignored", [])
+    silent = parameters.get("silent")
 
     def on_message(connection, message):
         if message.get_member() in ignored:
             return dbus.lowlevel.HANDLER_RESULT_HANDLED
         if message.get_member() != "GetAll":
             return dbus.lowlevel.HANDLER_RESULT_NOT_YET_HANDLED
+        if silent and message.get_path().startswith(silent):
+            return dbus.lowlevel.HANDLER_RESULT_HANDLED
         time.sleep(delay)
         if error:
             connection.send_message(dbus.lowlevel.ErrorMessage(message, error, "broken"))

@@ -1,10 +1,12 @@
 """Action sequences over D-Bus: timed outputs, their signals and how they are cut short."""
 
 import time
+from pathlib import Path
 
 import pytest
+from gi.repository import GLib
 
-from harness import DBusError, Device, hwdesc, port
+from harness import DBusError, Device, hwdesc, port, scale, wait_for
 
 OUTPUT, INPUT, VIRTUAL, CONFIGURABLE = 0, 1, 2, 3
 FOREVER = 2_000_000
@@ -152,6 +154,56 @@ def test_the_daemon_stops_cleanly_while_sequences_run_on_several_ports(device):
         start(device, number, *[(True, 1), (False, 1)] * 1000, (True, FOREVER))
     start(device, INPUT, (True, FOREVER), virtual=True)
     device.stop()
+
+
+MOST_STEPS = 65536
+
+
+def test_a_sequence_of_too_many_steps_is_refused_and_starts_nothing(device):
+    steps = [(True, 0)] * MOST_STEPS
+    too_many = "Generic: The sequence has too many steps."
+    assert refused(device, OUTPUT, *steps, (True, 0)) == too_many
+    with device.signals("ActionSequenceDone") as done:
+        start(device, OUTPUT, *steps)
+        done.wait(timeout=60)
+
+
+def longest_wait_during(device: Device, *steps: tuple[bool, int]) -> float:
+    """How long another call took at most, in seconds, while the siren's sequence ran."""
+    longest = 0.0
+    with device.signals("ActionSequenceDone") as done:
+        start(device, 5, *steps)
+        while not done.received:
+            began = time.monotonic()
+            device.call("GetState", "u", INPUT)
+            longest = max(longest, time.monotonic() - began)
+            GLib.MainContext.default().iteration(False)
+    return longest
+
+
+def test_a_sequence_without_pauses_keeps_nobody_waiting(make_device):
+    events = '<event declaration="IOPort"/><event declaration="PortAny"/>'
+    device = make_device()
+    device.environment["G_SLICE"] = "always-malloc"  # as the unit has it
+    device.conf(hwdesc(port("contact", INPUT), port("siren", 5, kind="output", extra=events)))
+    device.start()
+    steps = [(index % 2 == 0, 0) for index in range(MOST_STEPS)]
+    longest_wait_during(device, *steps[:1000])
+    resident = resident_kib(device)
+    assert longest_wait_during(device, *steps) < 0.25 * scale()
+    allowed = 128 * 1024 if device.sanitized else 2048
+    wait_for(lambda: resident_kib(device) - resident < allowed, "the memory to come back")
+
+
+def resident_kib(device: Device) -> int:
+    return int(device.status("VmRSS").split()[0])
+
+
+def test_the_limit_of_descriptors_is_the_highest_that_the_system_allows(device):
+    limits = Path(f"/proc/{device.pid}/limits").read_text().splitlines()
+    words = next(line.split() for line in limits if line.startswith("Max open files"))
+    soft, hard = words[3:5]
+    assert soft == hard
 
 
 def test_a_sequence_of_many_steps_keeps_their_order(device):

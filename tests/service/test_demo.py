@@ -10,6 +10,7 @@ import pytest
 
 from harness import default_binary, scale
 from harness.device import REPOSITORY
+from terminal import Terminal
 
 
 @pytest.fixture
@@ -45,7 +46,7 @@ def test_shows_the_table_and_then_the_changes(demo):
     # The optional port's module is plugged in later.
     assert [line.split()[1] for line in table.splitlines()[1:]] == [
         "door", "pir_detector", "forwarding", "relay", "io1", "alarm", "spare", "box1", "video_out",
-        "manualtrigger1", "manualtrigger2",
+        "fence", "manualtrigger1", "manualtrigger2",
     ]  # fmt: skip
     assert changes.startswith("1 video connector, 1 of them plugged in\n")
     assert re.search(r"^ +\d+\.\ds  port 0 Door contact +input +active$", changes, re.MULTILINE)
@@ -55,7 +56,7 @@ def test_shows_the_table_and_then_the_changes(demo):
     assert re.search(r"^ +\d+\.\ds  event \d+: port 2, state True$", changes, re.MULTILINE)
 
 
-@pytest.mark.parametrize("number", [signal.SIGINT, signal.SIGTERM])
+@pytest.mark.parametrize("number", [signal.SIGINT, signal.SIGTERM, signal.SIGHUP])
 def test_an_interrupt_is_a_regular_end(demo, number):
     process = demo()
     assert process.stdout is not None
@@ -64,3 +65,26 @@ def test_an_interrupt_is_a_regular_end(demo, number):
     process.send_signal(number)
     _, errors = process.communicate(timeout=60 * scale())
     assert (process.returncode, errors) == (0, "")
+
+
+def test_on_a_terminal_the_live_table_shows_what_happens(tmp_path):
+    command = [sys.executable, "demo/demo.py", "--binary", str(default_binary())]
+    env = {"PATH": "/usr/sbin:/usr/bin:/sbin:/bin", "TMPDIR": str(tmp_path), "TERM": "xterm"}
+    terminal = Terminal(command, env | {"LC_ALL": "C.UTF-8"}, 80, 24, cwd=REPOSITORY)
+    try:
+        screen = terminal.wait_text("q ends it")
+        helper = next(tmp_path.glob("portd-demo-*/portctl"))
+        terminal.wait_for(lambda text: re.search(r"10 Fence line .*\[[ocsx.]*#[ocsx.]*\]", text))
+        done = subprocess.run(
+            [helper, "get", "Relay"], capture_output=True, text=True, timeout=30 * scale()
+        )
+        assert (done.returncode, done.stderr) == (0, "")
+        screen = terminal.wait_text("a sequence of six steps")
+        assert len(screen) == 24 and max(map(len, screen)) <= 80
+        assert "q quit" in screen[23]
+        terminal.type("q")
+        assert terminal.wait_exit() == 0
+        assert terminal.is_as_before
+    finally:
+        terminal.close()
+    assert list(tmp_path.iterdir()) == []

@@ -280,11 +280,50 @@ def test_dropping_and_refreshing_ports_leaves_one_declaration_each(start):
         port("relay", 0, kind="output", extra=IOPORT),
         port("spare", 1, optional=True, extra=IOPORT + PORT_ANY),
     )
-    before = producer.declarations().keys()
+    before = len(producer.declarations())
     for _round in range(20):
         device.call("DropIOPorts", "as", ["spare"])
         device.call("RefreshIOPorts")
-    assert producer.declarations().keys() == before
+    assert len(producer.declarations()) == before
+
+
+def test_an_event_of_both_roles_names_the_port_as_its_role_does(start):
+    names = {"input": "Button", "output": "Lamp"}
+    device, producer = start(port("both", 0, "io_ctrl", names=names, extra=IOPORT))
+    assert producer.only("", port=0)["nice_names"]["port"] == ("Port", "Button")
+    device.call("SetDirection", "us", 0, "output")
+    assert producer.only("", port=0)["nice_names"]["port"] == ("Port", "Lamp")
+
+
+def test_the_same_direction_again_is_not_declared_anew(start):
+    device, producer = start(port("both", 0, "io_ctrl", extra=IOPORT))
+    before = producer.ids("", port=0)
+    device.call("SetDirection", "us", 0, "input")
+    assert producer.ids("", port=0) == before
+
+
+def test_of_several_property_keys_the_last_is_the_property_and_all_are_sent(start):
+    keys = (
+        key("first", "PORT_STATUS", "bool", 'property="true"'),
+        key("last", "PORT_ACTIVE", "string", 'property="true"'),
+    )
+    device, producer = start(port("relay", 0, "output", extra=event("Own.Type", *keys)))
+    # New keys are put in front of the earlier ones.
+    assert producer.only("Own.Type")["property"] == "first"
+    with producer.signals("Sent") as sent:
+        device.call("SetState", "ub", 0, True)
+        _, values = sent.wait()
+    assert (values["first"], values["last"]) == (True, "active")
+
+
+def test_a_dropped_port_is_withdrawn_and_comes_back_with_the_state_that_it_has(start):
+    device, producer = start(port("siren", 0, "output", optional=True, extra=IOPORT))
+    device.call("SetState", "ub", 0, True)
+    assert producer.only("", port=0)["keys"]["state"] is True
+    device.call("DropIOPorts", "as", ["siren"])
+    assert producer.ids("", port=0) == []
+    device.call("RefreshIOPorts")
+    assert producer.only("", port=0)["keys"]["state"] is False
 
 
 def test_the_events_are_withdrawn_when_the_daemon_stops(start):

@@ -329,8 +329,6 @@ def test_odd_identifiers(device, name):
 
 
 BROKEN_DOCUMENTS = {
-    "empty": "",
-    "blank": "  \n\n",
     "no markup": "ports: none",
     "wrong nesting": "<ports><port></ports></port>",
     "not utf-8": "<ports>\udcff</ports>",
@@ -345,6 +343,25 @@ def test_broken_documents(device, text):
     device.path("/usr/share/portd/conf.xml").write_bytes(text.encode(errors="surrogateescape"))
     device.start()
     call_everything(device)
+
+
+@pytest.mark.parametrize("text", ["", "  \n\n"], ids=["empty", "blank"])
+def test_an_empty_fragment_is_no_error_and_no_end_of_the_folder(device, text):
+    device.conf(hwdesc(port("a", 0)))
+    for number in range(1, 4):
+        device.fragment(f"{number}.xml", hwdesc(port(f"f{number}", number)))
+        device.fragment(f".keep{number}", text)
+    device.start()
+    assert sorted(identifiers(device)) == ["a", "f1", "f2", "f3"]
+
+
+def test_what_is_wrong_with_a_document_is_said_with_its_place(device):
+    device.allow_critical(PARSE_FAILURE)
+    device.conf("<ports>\n  <port name='a'>\n  </prot>\n</ports>\n")
+    device.start()
+    (line,) = [line for line in device.log().splitlines() if "/conf.xml:3:" in line]
+    assert line.startswith("WARNING: ")
+    assert "prot" in line
 
 
 def test_no_document_at_all(device):

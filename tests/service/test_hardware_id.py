@@ -115,14 +115,3 @@ def test_a_late_answer_is_waited_for(device, neighbourhood):
     device.start()
     assert time.monotonic() - began >= 5
     assert ids(device) == {"always", "same", "listed"}
-
-
-def test_a_service_that_hangs_holds_the_start_once_and_not_for_every_document(device, neighbourhood):
-    service = play(neighbourhood, device, "s", "ret = 'A1'")
-    for number in range(4, 8):
-        device.fragment(f"{number}.xml", hwdesc(port(f"more{number}", number, hwid="A1")))
-    service.hang()
-    began = time.monotonic()
-    device.start()
-    assert 24 < time.monotonic() - began < 30
-    assert ids(device) == EVERYTHING | {f"more{number}" for number in range(4, 8)}

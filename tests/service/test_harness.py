@@ -1,6 +1,7 @@
 """The harness itself: what it must catch and what it must not leave behind."""
 
 import os
+import resource
 import signal
 import subprocess
 import sys
@@ -8,6 +9,7 @@ from pathlib import Path
 
 import pytest
 
+from gpio_tree import GpioTree
 from harness import Device, Sandbox, hwdesc, port, wait_for
 
 
@@ -59,6 +61,58 @@ def test_bad_output_is_a_complaint(pretender, line):
     assert len(problems) == 1 and problems[0].endswith(line)
 
 
+def alive(pid: str) -> bool:
+    """A process that has ended is not, though it stays in the table where PID 1 does not reap it."""
+    try:
+        return Path(f"/proc/{pid}/stat").read_text().rpartition(")")[2].split()[0] not in "ZX"
+    except (FileNotFoundError, ProcessLookupError):
+        return False
+
+
+def test_a_process_that_was_not_reaped_is_not_alive():
+    process = subprocess.Popen(["true"])
+    wait_for(lambda: not alive(str(process.pid)), "the end of the process")
+    assert Path(f"/proc/{process.pid}").exists()
+    process.wait()
+
+
+def test_used_up_inotify_instances_are_told(tmp_path: Path):
+    # What runs out are this process's descriptors, which says the same.
+    first_free = os.dup(0)
+    os.close(first_free)
+    soft, hard = resource.getrlimit(resource.RLIMIT_NOFILE)
+    resource.setrlimit(resource.RLIMIT_NOFILE, (first_free, hard))
+    try:
+        with pytest.raises(OSError, match="no inotify instance: Too many open files; .*max_user_instances"):
+            GpioTree(tmp_path)
+    finally:
+        resource.setrlimit(resource.RLIMIT_NOFILE, (soft, hard))
+
+
+def test_who_may_not_mount_is_told_how_to():
+    """Without the capability, and where there can be no user namespace to have it in: within another
+    that allows none, or in a chroot.
+    """
+    script = f"""
+import sys
+sys.path.insert(0, {str(Path(__file__).parent)!r})
+from harness import NoMounts, become_root
+try:
+    become_root()
+except NoMounts as error:
+    print(error)
+"""
+    limit = "echo 0 >/proc/sys/user/max_user_namespaces"
+    drop = "setpriv --bounding-set=-sys_admin --inh-caps=-sys_admin"
+    shell = f'{limit}; exec {drop} "$0" -c "$1"'
+    outer = ["unshare", "-U", "-r"]
+    if subprocess.run([*outer, "true"], stderr=subprocess.DEVNULL).returncode != 0:
+        outer, shell = [], f'exec {drop} "$0" -c "$1"'
+    command = [*outer, "sh", "-c", shell, sys.executable, script]
+    told = subprocess.run(command, capture_output=True, text=True, check=True).stdout
+    assert "CAP_SYS_ADMIN" in told and len(told.splitlines()) == 1
+
+
 def test_nothing_outlives_a_killed_harness(device, tmp_path: Path):
     device.conf(hwdesc())
     script = f"""
@@ -77,12 +131,12 @@ sys.stdin.read()
     )
     assert harness.stdin is not None and harness.stdout is not None
     pids = harness.stdout.readline().split()
-    assert len(pids) == 3 and all(Path(f"/proc/{pid}").exists() for pid in pids)
+    assert len(pids) == 3 and all(map(alive, pids))
     os.kill(harness.pid, signal.SIGKILL)
     harness.wait()
     harness.stdin.close()
     harness.stdout.close()
-    wait_for(lambda: not any(Path(f"/proc/{pid}").exists() for pid in pids), "the processes' end")
+    wait_for(lambda: not any(map(alive, pids)), "the processes' end")
 
 
 def test_devices_are_apart_from_each_other(make_device):

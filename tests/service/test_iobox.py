@@ -125,33 +125,6 @@ def test_ports_keep_their_state_when_the_monitor_vanishes_and_calls_are_still_an
     assert ids(device) == {"fixed"}
 
 
-def test_ports_follow_a_monitor_that_is_restarted(device, neighbourhood):
-    IoBox(neighbourhood, device).service.stop()
-    device.start()
-    for _ in range(3):
-        box = IoBox(neighbourhood, device)
-        device.call("RefreshIOPorts")
-        expect_working(device, box)
-        box.service.stop()
-    box = IoBox(neighbourhood, device)
-    device.call("DropIOPorts", "as", OPTIONAL)
-    device.call("RefreshIOPorts")
-    assert ids(device) == ON_THE_BOX
-    assert (OUTPUT, 0, "out") in box.modes()
-    expect_working(device, box)
-
-
-def test_ports_follow_a_monitor_that_another_one_replaces(device, neighbourhood):
-    first = IoBox(neighbourhood, device)
-    device.start()
-    second = IoBox(neighbourhood, device)
-    expect_working(device, second)
-    with device.signals() as changes:
-        first.service.emit(IoBox.PATH, "IOStateChanged", "is", INPUT, "closed")
-        barrier(device, changes, OTHER)
-        assert [change.port for change in changes.received if not change.virtual_trig] in ([], [INPUT])
-
-
 def test_many_drops_and_refreshes_leave_one_reaction_to_a_change(device, neighbourhood):
     box = IoBox(neighbourhood, device)
     device.start()
@@ -312,32 +285,6 @@ def test_a_monitor_that_answers_late_is_waited_for(make_device, neighbourhood):
     assert state(device, INPUT) is True
 
 
-def test_a_monitor_that_hangs_holds_start_up_once_and_not_for_every_port(make_device, neighbourhood):
-    device = make_device()
-    numbers = range(20, 60)
-    device.conf(hwdesc(
-        port("output", OUTPUT, kind="output", backend="iobox"),
-        *(port(f"port{number}", number, backend="iobox", optional=True) for number in numbers),
-        port("other", OTHER),
-    ))  # fmt: skip
-    box = IoBox(neighbourhood, device)
-    box.service.hang()
-    began = time.monotonic()
-    device.start()
-    assert 24 < time.monotonic() - began < 35
-    began = time.monotonic()
-    assert state(device, OTHER) is False
-    assert ids(device) == {"output"}
-    assert time.monotonic() - began < 2
-    began = time.monotonic()
-    device.call("RefreshIOPorts", timeout=60)
-    assert time.monotonic() - began < 15
-    box.service.close()
-    box = IoBox(neighbourhood, device)
-    device.call("RefreshIOPorts")
-    assert len(ids(device)) == 1 + len(numbers)
-
-
 @pytest.mark.parametrize(
     "method, kind, in_service", [("GetIOState", "input", 0), ("SetIOMode", "output", 20)]
 )
@@ -356,9 +303,6 @@ def test_a_method_that_is_never_answered_holds_start_up_once_and_not_for_every_p
     assert 24 < time.monotonic() - began < 35
     assert len(ids(device)) == in_service
     assert device.log_count(f"{NO_CALL}{method}: ") == 20
-    began = time.monotonic()
-    device.call("RefreshIOPorts")
-    assert time.monotonic() - began < 10
 
 
 # Line states

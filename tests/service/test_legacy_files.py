@@ -104,6 +104,16 @@ def test_a_mapping_that_cannot_be_written(device):
     assert not device.path(TEMPORARY).exists()
 
 
+def test_a_device_without_the_folders_is_silent(device):
+    for path in (REGISTRY, MAPPINGS):
+        device.path(path).parent.rmdir()
+    device.conf(four_ports())
+    device.start()
+    device.call("RefreshIOPorts")
+    assert "Couldn't write" not in device.output()
+    assert not device.path(TEMPORARY).exists()
+
+
 @pytest.mark.parametrize("path", [REGISTRY, MAPPINGS])
 def test_a_folder_on_a_mount_of_its_own(make_device, path):
     device = make_device(tmpfs={str(Path(path).parent): "64k"})
@@ -177,14 +187,28 @@ def test_drop_and_refresh_renew_objects_and_files(device):
         assert device.call("DropIOPorts", "as", ["opt"]) == ["opt"]
         assert tool.numbers() == [0, 1]
         assert announced.wait_count(2) == announcement(1, 1)
-        assert "IOPort/2" not in device.read(REGISTRY)
-        assert "IOPort/2" not in device.read(MAPPINGS)
+        for path in (REGISTRY, MAPPINGS):
+            wait_for(lambda: "IOPort/2" not in device.read(path), f"port 2 to leave {path}")
         announced.take()
         device.call("RefreshIOPorts")
         assert tool.numbers() == [0, 1, 2]
         assert announced.wait_count(2) == announcement(2, 1)
-    assert (device.read(REGISTRY), device.read(MAPPINGS)) == full
+    wait_for(lambda: (device.read(REGISTRY), device.read(MAPPINGS)) == full, "the port's return")
     assert device.bus.has_owner(SERVICE)
+
+
+def test_files_that_would_not_change_are_left_alone(device):
+    virtual = port("virt", 1, kind="output", backend="virtual", flags="virtual", optional=True)
+    device.conf(hwdesc(port("in0", 0), virtual))
+    if is_real_root():
+        give_folders_to_pcd(device)
+    device.start()
+    before = [device.path(path).stat().st_ino for path in (REGISTRY, MAPPINGS)]
+    assert device.call("DropIOPorts", "as", ["virt"]) == ["virt"]
+    # The same thread stores what is asked of it later.
+    device.call("SetName", "ubs", 0, True, "Marker")
+    wait_for(lambda: "input_name=Marker\n" in device.read_settings(), "the later save")
+    assert [device.path(path).stat().st_ino for path in (REGISTRY, MAPPINGS)] == before
 
 
 def test_nothing_is_renewed_without_a_change(device):
@@ -268,6 +292,7 @@ def test_name_refused(device):
 
 
 def test_no_bus_does_not_matter_when_switched_off(device):
+    device.allow_critical("No interface is served until there is a system bus")
     device.conf(four_ports())
     device.bus.start()
     device.bus.kill()

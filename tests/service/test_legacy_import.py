@@ -1,10 +1,14 @@
 """Settings that older firmware left."""
 
+import os
 import random
+import time
 
 import pytest
 
-from harness import hwdesc, port
+from harness import Device, hwdesc, is_real_root, port
+from harness.device import PCD_ID
+from harness.waiting import scale
 from legacy_tool import (
     BASE,
     EARLIER,
@@ -57,17 +61,11 @@ def test_export_wins_over_settings_win_over_earlier_ones(device):
     assert device.path(EXPORT).exists()
 
 
-def test_earlier_settings_wait_for_an_export(device):
+@pytest.mark.parametrize("export", ["absent", "no file"])
+def test_earlier_settings_wait_for_an_export(device, export):
     device.conf(four_ports())
-    device.write(EARLIER, "[in0]\ninput_name=earlier\ninput_activelow=true\n")
-    device.start()
-    assert device.path(EARLIER).exists()
-    assert Tool(device).get(0, INPUT, "Name") == "Input 1"
-
-
-def test_an_export_that_is_no_file(device):
-    device.conf(four_ports())
-    device.mkdir(EXPORT)
+    if export == "no file":
+        device.mkdir(EXPORT)
     device.write(EARLIER, "[in0]\ninput_name=earlier\ninput_activelow=true\n")
     device.start()
     assert device.path(EARLIER).exists()
@@ -114,3 +112,72 @@ def test_exports_of_rubbish(device, seed):
     device.path(EXPORT).unlink()
     device.restart()
     assert {key: tool.get_all(*key) for key in before} == before
+
+
+# Who may leave an export
+
+GATE = "[IOPort.I0.Input]\nName=Gate\n"
+NOBODY = 65534
+
+
+def assert_left_alone(device: Device, reason: str) -> None:
+    begun = time.monotonic()
+    device.start()
+    assert time.monotonic() - begun < 5 * scale()
+    assert device.log_count(f"WARNING: portd: Left {EXPORT} alone: {reason}") == 1
+    assert Tool(device).get(0, INPUT, "Name") == "Input 1"
+    assert device.path(EARLIER).exists()
+
+
+@pytest.fixture
+def exported(device) -> Device:
+    """A device with an export and with settings that wait for one."""
+    device.conf(four_ports())
+    device.write(EARLIER, "[in0]\ninput_name=earlier\ninput_activelow=true\n")
+    device.write(EXPORT, GATE)
+    return device
+
+
+@pytest.mark.parametrize("owner", [0, PCD_ID] if is_real_root() else [os.geteuid()])
+def test_an_export_of_roots_or_of_the_accounts_counts(exported, owner):
+    os.chown(exported.path(EXPORT), owner, owner)
+    exported.start()
+    assert Tool(exported).get(0, INPUT, "Name") == "Gate"
+    assert not exported.path(EARLIER).exists()
+
+
+def test_an_export_of_somebody_elses_drives_nothing(exported):
+    if not is_real_root():
+        return  # nobody but root can leave one
+    exported.write(EXPORT, "[IOPort.I1.Output]\nActive=open\n" + GATE)
+    os.chown(exported.path(EXPORT), NOBODY, NOBODY)
+    assert_left_alone(exported, f"it belongs to uid {NOBODY}")
+    assert exported.call("GetActive", "u", 1) == ("closed", "closed")
+
+
+def test_a_huge_export_costs_nothing(exported):
+    with exported.path(EXPORT).open("ab") as file:
+        file.truncate(2 << 30)
+    assert_left_alone(exported, "File too large")
+    if not exported.sanitized:
+        assert int(exported.status("VmHWM").split()[0]) < 64 * 1024  # kB
+
+
+@pytest.mark.parametrize("size, counts", [(1 << 20, True), ((1 << 20) + 1, False)])
+def test_an_export_has_at_most_a_mebibyte(exported, size, counts):
+    exported.write(EXPORT, GATE + "#" * (size - len(GATE)))
+    exported.start()
+    assert Tool(exported).get(0, INPUT, "Name") == ("Gate" if counts else "Input 1")
+
+
+def test_a_pipe_for_an_export_does_not_hold_up_the_start(exported):
+    exported.path(EXPORT).unlink()
+    os.mkfifo(exported.path(EXPORT), 0o666)
+    assert_left_alone(exported, "Not a regular file")
+
+
+def test_a_link_for_an_export_is_not_followed(exported):
+    exported.write("/etc/export", GATE)
+    exported.path(EXPORT).unlink()
+    exported.path(EXPORT).symlink_to("/etc/export")
+    assert_left_alone(exported, "Is a link")

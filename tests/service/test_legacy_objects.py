@@ -23,8 +23,9 @@ from legacy_tool import (
     count_of_ports,
     fails,
     four_ports,
+    saved_groups,
     saves,
-    settings_identity,
+    settle,
     text,
     tool_fixture,
 )
@@ -165,6 +166,7 @@ def test_name(tool):
     assert tool.get(2, INPUT, "Name") == "Gate"
     assert tool.get(2, OUTPUT, "Name") == "Sirène €"
     assert tool.device.call("GetNames", "u", 2) == ("Gate", "Sirène €")
+    settle(tool)
     settings = tool.device.read_settings()
     assert "input_name=Gate\n" in settings and "output_name=Sirène €\n" in settings
     assert saves(tool, 2, INPUT, "Name", "Gate"), "a name is saved although it was there"
@@ -207,10 +209,10 @@ def test_direction_of_a_configurable_port(tool):
 
 
 def test_a_direction_that_is_none(tool):
-    before = settings_identity(tool.device)
-    assert fails(INVALID, tool.set, 2, BASE, "Direction", "Input") == "Bad Direction 'Input'"
-    tool.device.wait_log("Undefined input: Input, for property: Direction")
-    assert settings_identity(tool.device) == before
+    with saved_groups(tool) as saved:
+        assert fails(INVALID, tool.set, 2, BASE, "Direction", "Input") == "Bad Direction 'Input'"
+        tool.device.wait_log("Undefined input: Input, for property: Direction")
+    assert not saved
 
 
 def test_output_behaviour(tool):
@@ -233,11 +235,11 @@ def test_an_unknown_button_is_saved_unchanged(tool):
 
 
 def test_refused_values_are_not_saved(tool):
-    before = settings_identity(tool.device)
-    for request in ((2, INPUT, "Trig", "x"), (2, OUTPUT, "Active", "x"), (1, OUTPUT, "Mode", "x"),
-                    (0, BASE, "Direction", "output"), (2, BASE, "Direction", "x")):  # fmt: skip
-        fails(INVALID, tool.set, *request)
-    assert settings_identity(tool.device) == before
+    with saved_groups(tool) as saved:
+        for request in ((2, INPUT, "Trig", "x"), (2, OUTPUT, "Active", "x"), (1, OUTPUT, "Mode", "x"),
+                        (0, BASE, "Direction", "output"), (2, BASE, "Direction", "x")):  # fmt: skip
+            fails(INVALID, tool.set, *request)
+    assert not saved
 
 
 def test_settings_outlive_a_restart(tool):
@@ -245,6 +247,7 @@ def test_settings_outlive_a_restart(tool):
     tool.set(2, OUTPUT, "Name", "Lock")
     tool.set(2, OUTPUT, "DelayTime", -1)
     tool.set(2, OUTPUT, "PulseTime", -1)
+    settle(tool)
     assert "delay_time=18446744073709551615" in tool.device.read_settings()
     assert "pulse_time=4294967295" in tool.device.read_settings()
     before = tool.get_all(2, OUTPUT)
@@ -256,32 +259,32 @@ def test_settings_outlive_a_restart(tool):
 
 @pytest.mark.parametrize("number", range(4))
 def test_byte_strings_that_are_no_text(tool, number):
-    before = {i: tool.get_all(number, i) for i in tool.interfaces(number)}
-    saved = settings_identity(tool.device)
-    for interface in tool.interfaces(number):
-        for name in set(WRITABLE[interface]) - set(NUMBERS):
-            for raw in (b"", b"open", b"output", b"pulse", b"\xff\xfe\0", b"Caf\xe9\0", b"\xc0\x80\0"):
-                message = fails(INVALID, tool.set_variant, number, interface, name, text(raw))
-                expected = "Bad Direction ''" if name == "Direction" else f"Incorrect value for {name}"
-                assert message == expected
-    assert {i: tool.get_all(number, i) for i in tool.interfaces(number)} == before
-    assert settings_identity(tool.device) == saved
+    with saved_groups(tool) as saved:
+        before = {i: tool.get_all(number, i) for i in tool.interfaces(number)}
+        for interface in tool.interfaces(number):
+            for name in set(WRITABLE[interface]) - set(NUMBERS):
+                for raw in (b"", b"open", b"output", b"pulse", b"\xff\xfe\0", b"Caf\xe9\0", b"\xc0\x80\0"):
+                    message = fails(INVALID, tool.set_variant, number, interface, name, text(raw))
+                    expected = "Bad Direction ''" if name == "Direction" else f"Incorrect value for {name}"
+                    assert message == expected
+        assert {i: tool.get_all(number, i) for i in tool.interfaces(number)} == before
+    assert not saved
 
 
 def test_wrong_types(tool):
-    before = {(n, i): tool.get_all(n, i) for n in range(4) for i in tool.interfaces(n)}
-    saved = settings_identity(tool.device)
-    for number, interface in before:
-        for name in READABLE[interface]:
-            for value in ("'open'", "true", "uint32 1", "int64 1", "1.0", "['a']", "<'a'>", "b'open'",
-                          "1", "(1,)", "@a{sv} {}", "[true]", "@as []"):  # fmt: skip
-                variant = GLib.Variant.parse(None, value, None, None)
-                wanted = "i" if name in NUMBERS else "ay"
-                if name in WRITABLE[interface] and variant.get_type_string() == wanted:
-                    continue
-                fails(INVALID, tool.set_variant, number, interface, name, variant)
-    assert {(n, i): tool.get_all(n, i) for n, i in before} == before
-    assert settings_identity(tool.device) == saved
+    with saved_groups(tool) as saved:
+        before = {(n, i): tool.get_all(n, i) for n in range(4) for i in tool.interfaces(n)}
+        for number, interface in before:
+            for name in READABLE[interface]:
+                for value in ("'open'", "true", "uint32 1", "int64 1", "1.0", "['a']", "<'a'>", "b'open'",
+                              "1", "(1,)", "@a{sv} {}", "[true]", "@as []"):  # fmt: skip
+                    variant = GLib.Variant.parse(None, value, None, None)
+                    wanted = "i" if name in NUMBERS else "ay"
+                    if name in WRITABLE[interface] and variant.get_type_string() == wanted:
+                        continue
+                    fails(INVALID, tool.set_variant, number, interface, name, variant)
+        assert {(n, i): tool.get_all(n, i) for n, i in before} == before
+    assert not saved
 
 
 def random_variant(chance: random.Random, depth: int = 0) -> GLib.Variant:

@@ -11,7 +11,8 @@ from converters import (
     supervise,
     supervised_port,
 )
-from harness import Device, Signals
+from gpio_tree import device_on_lines
+from harness import Signals, wait_for
 from producer import SUPERVISED as EVENT
 from producer import Producer
 
@@ -22,9 +23,7 @@ RANGES = "".join(
 COMPARATOR = "iio:device6"
 
 
-@pytest.fixture
-def device(make_device, tree) -> Device:
-    return make_device(binds={"/sys": tree.sys})
+device = pytest.fixture(device_on_lines)
 
 
 @pytest.fixture
@@ -119,7 +118,7 @@ def test_without_supervision_nothing_is_sent(device, converters):
 def test_a_line_that_cannot_be_read_is_told_as_undefined(device, converters):
     for text in ("Failed to read sysfs path", "Readout failed", "Couldn't read adc value"):
         device.allow_critical(text)
-    start(device, with_event("iio-interrupt", 'driver="comparator"'))
+    start(device, with_event("iio-interrupt", 'driver="comparator" cache_ad_value="false"'))
     with Producer(device).signals("Sent") as sent:
         supervise(device)
         converters.send_event(6, 0)
@@ -129,3 +128,23 @@ def test_a_line_that_cannot_be_read_is_told_as_undefined(device, converters):
         wait_told(sent, "undefined", False)
         converters.level(COMPARATOR, "in_voltage0_raw", 0xA00)
         wait_told(sent, "cut", True)
+
+
+def test_switching_supervision_while_a_sequence_sends_events_loses_none(device, converters):
+    """The line stays undefined, so that nothing but the sequence has an event to send."""
+    converters.answer(0x50)
+    event = '<event declaration="IOPort" supervised_input="true"/>'
+    text = supervised_port("spi", f'<device path="/run/converters/spidev0"/>{RANGES}', event=event)
+    start(device, text)
+    steps = [(index % 2 == 0, 1) for index in range(800)]
+    switched = 0
+    with (
+        device.signals("ActionSequenceDone") as done,
+        Producer(device).signals("Sent") as sent,
+    ):
+        device.call("StartActionSequence", "uba(bi)", 0, True, steps)
+        while not done.received:
+            switched += 1
+            supervise(device, switched % 2 == 1)
+            wait_for(lambda: True, "signals that have come")
+        assert (len(sent.received), switched > 1) == (len(steps), True)

@@ -14,7 +14,9 @@ from converters import (
     supervised_port,
     wait_readout,
 )
-from harness import Device, wait_for
+from gpio_tree import device_on_lines
+from harness import wait_for
+from harness.sandbox import is_real_root
 
 NODE = "iio:device2"
 RANGES = range_element("closed", 100, 200) + range_element("cut", 3000, 4000)
@@ -22,9 +24,7 @@ DEVICE = '<device name="buffer" adc="adc" hrtimer="pulse" freq="50" channel="3"/
 LOST = ("read Error: ", "Readout failed: ")
 
 
-@pytest.fixture
-def device(make_device, tree) -> Device:
-    return make_device(binds={"/sys": tree.sys})
+device = pytest.fixture(device_on_lines)
 
 
 @pytest.fixture
@@ -56,6 +56,16 @@ def iio(elements: str = RANGES, **options) -> str:
 
 def sample(converters: Converters, level: int) -> None:
     converters.send(NODE, struct.pack("<H", level))
+
+
+def sample_until_it_is_read(device, converters: Converters, level: int) -> None:
+    """A device that is back has no old samples to tell: those that come too early are dropped."""
+
+    def is_read() -> bool:
+        sample(converters, level)
+        return readout(device) == ("closed", level)
+
+    wait_for(is_read, f"the sample {level} to be read")
 
 
 def test_sets_up_timer_trigger_and_buffer(device, converters, tree):
@@ -134,14 +144,42 @@ def test_a_lost_device_reads_undefined_without_a_busy_loop_and_comes_back(device
         wait_readout(device, "undefined", 150)
         signals.wait()
         make_buffer(converters)
-        # The daemon looks for it once a second, and has to do nothing else until then.
+        # The daemon looks for it after a second, and has to do nothing else until then.
         wait_for(lambda: converters.read(NODE, "buffer/enable") == "1", "the device to be found")
         assert processor_time(device) - used < 0.5
         signals.take()
-        sample(converters, 160)
-        wait_readout(device, "closed", 160)
+        sample_until_it_is_read(device, converters, 160)
         signals.wait(lambda change: change.state)
     assert device.log_count("read Error: ") == 1
+    assert device.log_count("Port line0: buffer is back") == 1
+
+
+def test_a_device_that_is_back_without_rights_is_logged_once_and_tried_again(device, converters):
+    for text in LOST:
+        device.allow_critical(text)
+    start(device, iio())
+    supervise(device)
+    converters.keep_from_account(NODE)
+    converters.hang_up(NODE)
+    device.wait_log("read Error: No such device")
+    if is_real_root():
+        refused = f"buffer is back, but /sys/bus/iio/devices/{NODE}/buffer/enable can't be opened"
+        device.wait_log(refused)
+    make_buffer(converters)
+    sample_until_it_is_read(device, converters, 160)
+    if is_real_root():
+        assert device.log_count(refused) == 1
+
+
+def test_samples_that_were_queued_while_nobody_watched_are_no_news(device, converters):
+    start(device, iio())
+    with device.signals() as signals:
+        for level in (3500, 3600):
+            sample(converters, level)
+        supervise(device)
+        sample(converters, 150)
+        wait_readout(device, "closed", 150)
+        assert len(signals.wait_count(1)) == 1
 
 
 def test_a_short_sample_reads_undefined_and_the_next_one_counts(device, converters):

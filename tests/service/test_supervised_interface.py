@@ -17,7 +17,8 @@ from converters import (
     supervised_port,
     wait_readout,
 )
-from harness import Device, port, wait_for
+from gpio_tree import device_on_lines
+from harness import port, wait_for
 
 METHODS = {
     "GetNumberOfPorts": [("inputs", "u", "out"), ("outputs", "u", "out")],
@@ -33,7 +34,7 @@ METHODS = {
         ("port", "u", "in"), ("state", "s", "out"), ("level", "u", "out"),
     ],
     "GetSupervisedStates": [
-        ("port", "u", "in"), ("nbrstates", "u", "out"), ("states", "as", "out"),
+        ("port", "u", "in"), ("nbrstates", "u", "out"), ("states", "a(s)", "out"),
     ],
     "GetSupervisedPortNumbers": [("ports", "au", "out")],
 }  # fmt: skip
@@ -51,9 +52,7 @@ BY_NUMBER = [
 BY_FLAG = BY_NUMBER[:3]
 
 
-@pytest.fixture
-def device(make_device, tree) -> Device:
-    return make_device(binds={"/sys": tree.sys})
+device = pytest.fixture(device_on_lines)
 
 
 @pytest.fixture
@@ -138,7 +137,7 @@ def test_a_port_that_cannot_be_supervised_says_so(device, converters, call):
 def test_offers_four_states(device, converters):
     start(device, spi())
     states = supervised(device, "GetSupervisedStates", "u", 0)
-    assert states == (4, ["closed", "open", "short", "cut"])
+    assert states == (4, [("closed",), ("open",), ("short",), ("cut",)])
 
 
 def test_ranges_are_kept_in_the_order_in_which_they_were_set(device, converters):

@@ -1,32 +1,18 @@
 #include "platform/kv-log.h"
 
 #include <glib.h>
+#include <unistd.h>
 
-#include <cstdio>
+#include <cstdint>
+#include <cstdlib>
+#include <memory>
 #include <string>
 #include <string_view>
 
+#include "platform/host/log-line.h"
+#include "platform/host/log-stream.h"
+
 namespace {
-
-struct Level {
-  GLogLevelFlags flag;
-  const char *word;
-};
-
-constexpr Level kLevels[] = {
-    {G_LOG_LEVEL_ERROR, "ERROR"},     {G_LOG_LEVEL_CRITICAL, "CRITICAL"},
-    {G_LOG_LEVEL_WARNING, "WARNING"}, {G_LOG_LEVEL_MESSAGE, "MESSAGE"},
-    {G_LOG_LEVEL_INFO, "INFO"},       {G_LOG_LEVEL_DEBUG, "DEBUG"},
-};
-
-std::string level_word(int level) {
-  for (const auto &entry : kLevels) {
-    if (level & entry.flag) {
-      return entry.word;
-    }
-  }
-  return "LEVEL" + std::to_string(level & G_LOG_LEVEL_MASK);
-}
 
 std::string_view field(const GLogField *fields, gsize count, const char *key) {
   for (gsize i = 0; i < count; ++i) {
@@ -39,19 +25,22 @@ std::string_view field(const GLogField *fields, gsize count, const char *key) {
   return {};
 }
 
-// One message is one line, whatever a port's name or a neighbour's error text holds: a line break
-// inside the text would let a client forge a log line of its own.
-void append_as_one_line(std::string &line, std::string_view text) {
-  while (!text.empty() && text.back() == '\n') {
-    text.remove_suffix(1);
-  }
-  for (const char c : text) {
-    if (c == '\n' || c == '\r') {
-      line += ' ';
-    } else {
-      line += c;
-    }
-  }
+// Asked at the first message, when standard output is what it stays.
+bool prints_to_journal() {
+  static const bool journal = is_journal_stream(STDOUT_FILENO, std::getenv("JOURNAL_STREAM"));
+  return journal;
+}
+
+std::string describe_loss(std::uint64_t count) {
+  const std::string text = std::to_string(count) + " log lines were lost: nobody read them";
+  return log_line({G_LOG_LEVEL_WARNING, G_LOG_DOMAIN, text}, prints_to_journal());
+}
+
+LogStream &log_stream() {
+  // Never freed: threads may log until the process is gone.
+  static LogStream *const stream =
+      std::make_unique<LogStream>(STDOUT_FILENO, describe_loss).release();
+  return *stream;
 }
 
 // Applications have levels above GLib's own, which the type that GLib passes them in can't hold by
@@ -67,14 +56,8 @@ __attribute__((no_sanitize("enum"))) GLogWriterOutput write_to_stdout(GLogLevelF
                                       domain.empty() ? nullptr : domain.c_str())) {
     return G_LOG_WRITER_HANDLED;
   }
-  std::string line = level_word(level) + ": ";
-  if (!domain.empty()) {
-    line += domain + ": ";
-  }
-  append_as_one_line(line, field(fields, count, "MESSAGE"));
-  line += '\n';
-  (void)std::fwrite(line.data(), 1, line.size(), stdout);
-  (void)std::fflush(stdout);
+  const LogMessage message = {level, domain, field(fields, count, "MESSAGE")};
+  log_stream().write_line(log_line(message, prints_to_journal()));
   return G_LOG_WRITER_HANDLED;
 }
 

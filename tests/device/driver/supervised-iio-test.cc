@@ -4,6 +4,7 @@
 #include <memory>
 
 #include "support/mock-iio.h"
+#include "support/rights.h"
 #include "support/supervised-test.h"
 
 namespace {
@@ -179,6 +180,41 @@ TEST_F(SupervisedIio, ADeviceThatGoesReadsUndefinedAndCostsNothing) {
   MockIio::unplug();
   EXPECT_TRUE(wait_until([&] { return client_.readout(0).state == "undefined"; }));
   EXPECT_LE(daemon_.load_percent(kIdleTime), kIdlePercent);
+}
+
+// Whose node and attributes are root's, as the kernel has it.
+TEST_F(SupervisedIio, AConverterThatIsBackIsUsedAsSoonAsTheAccountMay) {
+  MockIio::set_value(kChannel, kClosed);
+  supervise();
+  ASSERT_TRUE(reads(0, "closed", kClosed));
+  MockIio::unplug();
+  EXPECT_TRUE(wait_until([&] { return client_.readout(0).state == "undefined"; }));
+  MockIio::plug();
+  EXPECT_TRUE(wait_until([] { return Daemon::logged("mock-adc0 is back, but "); }));
+  MockIio::set_value(kChannel, kOpen);
+  grant(MockIio::node());
+  grant_tree(MockIio::folder());
+  grant_tree(TimerTrigger::folder());
+  EXPECT_TRUE(reads(0, "open", kOpen));
+  EXPECT_EQ(Daemon::log_count("mock-adc0 is back, but "), 1);
+}
+
+// The kernel keeps the oldest samples while nobody reads.
+TEST_F(SupervisedIio, SamplesThatWereQueuedWhileNobodyWatchedAreNoNews) {
+  MockIio::set_value(kChannel, kOpen);
+  start(document("100"));
+  for (int round = 0; round < 3; ++round) {
+    MockIio::set_value(kChannel, kOpen);
+    keep_level();
+    MockIio::set_value(kChannel, kClosed);
+    client_.forget_changes();
+    EXPECT_EQ(client_.set_supervised(0, true), "");
+    EXPECT_TRUE(reads(0, "closed", kClosed));
+    client_.catch_up();
+    ASSERT_EQ(client_.count_changes(0), 1) << "round " << round;
+    EXPECT_TRUE(client_.changes().front().state);
+    EXPECT_EQ(client_.set_supervised(0, false), "");
+  }
 }
 
 TEST_F(SupervisedIio, SamplesThatNobodyWantsCostNothing) {

@@ -1,7 +1,10 @@
 // Supervised inputs on a converter that raises events beyond thresholds.
+#include <sys/stat.h>
+
 #include <memory>
 
 #include "support/mock-iio.h"
+#include "support/rights.h"
 #include "support/supervised-test.h"
 
 namespace {
@@ -264,14 +267,80 @@ TEST_F(Thresholds, TheLastDroppedPortGivesTheEventsBack) {
   EXPECT_TRUE(MockIio::take_events());
 }
 
-TEST_F(Thresholds, ADeviceThatGoesReadsUndefinedAndCostsNothing) {
+TEST_F(Thresholds, ADeviceThatGoesIsAnErrorAndCostsNothing) {
   plug_in();
   MockIio::set_value(0, kClosed);
   start(port(0, 0));
   supervise_all(1);
   MockIio::unplug();
-  EXPECT_TRUE(wait_until([&] { return client_.readout(0).state == "undefined"; }));
+  EXPECT_TRUE(wait_until([&] { return client_.readout(0).state.starts_with("error: "); }));
   EXPECT_LE(daemon_.load_percent(kIdleTime), kIdlePercent);
+}
+
+// The daemon opened everything as root and is the service account now, which may open nothing of
+// the converter: its node and its attributes are root's.
+class ThresholdsOfTheKernel : public Thresholds {
+ protected:
+  void expect_no_rights() const {
+    for (const std::string &file :
+         {MockIio::node(), MockIio::folder() + "events/in_voltage0_thresh_rising_en"}) {
+      struct stat status {};
+      EXPECT_EQ(stat(file.c_str(), &status), 0) << file;
+      EXPECT_EQ(status.st_uid, 0U) << file;
+      EXPECT_EQ(status.st_mode & (S_IWGRP | S_IWOTH), 0U) << file;
+    }
+  }
+};
+
+TEST_F(ThresholdsOfTheKernel, ReadsThatFailCostNothing) {
+  plug_in();
+  MockIio::set_value(0, kOpen);
+  MockIio::set_value(1, kOpen);
+  start(port(0, 0) + port(1, 1));
+  expect_no_rights();
+  supervise_all(2);
+  for (const int channel : {0, 1}) {
+    MockIio::fail_reads(4);
+    MockIio::set_value(channel, kCut);
+    EXPECT_TRUE(wait_until([] { return MockIio::reads_to_fail() == 0; }));
+    EXPECT_TRUE(reads(channel, "cut", kCut));
+    EXPECT_TRUE(becomes_enabled(channel, {1, 1}));
+    client_.forget_changes();
+    MockIio::set_value(channel, kOpen);
+    EXPECT_TRUE(changes(channel, 1, "open", kOpen));
+  }
+}
+
+TEST_F(ThresholdsOfTheKernel, SwitchedOffAndOnAPortThatCouldNotBeReadIsBack) {
+  plug_in();
+  MockIio::set_value(0, kOpen);
+  start(port(0, 0));
+  MockIio::fail_reads(1);
+  supervise_all(1);
+  EXPECT_EQ(client_.set_supervised(0, false), "");
+  EXPECT_EQ(client_.set_supervised(0, true), "");
+  EXPECT_EQ(enabled(0), std::make_pair(1, 1));
+  MockIio::set_value(0, kClosed);
+  EXPECT_TRUE(changes(0, 1, "closed", kClosed));
+}
+
+TEST_F(ThresholdsOfTheKernel, AConverterThatIsBackIsUsedAsSoonAsTheAccountMay) {
+  plug_in();
+  start(port(0, 0) + port(1, 1));
+  supervise_all(2);
+  MockIio::unplug();
+  EXPECT_TRUE(wait_until([] { return Daemon::logged("read Error: "); }));
+  MockIio::plug();
+  EXPECT_TRUE(wait_until([] { return Daemon::log_count("mock-adc0 is back, but ") == 2; }));
+  expect_no_rights();
+  grant(MockIio::node());
+  grant_tree(MockIio::folder());
+  for (const int channel : {0, 1}) {
+    EXPECT_TRUE(becomes_enabled(channel, {1, 1})) << channel;
+    MockIio::set_value(channel, kCut);
+    EXPECT_TRUE(reads(channel, "cut", kCut));
+  }
+  EXPECT_EQ(Daemon::log_count("mock-adc0 is back, but "), 2);  // once for each port
 }
 
 }  // namespace

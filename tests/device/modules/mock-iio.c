@@ -51,6 +51,9 @@ MODULE_PARM_DESC(shared_frequency, "sampling_frequency in place of in_voltage_sa
 static unsigned int scans;
 module_param(scans, uint, 0644);
 MODULE_PARM_DESC(scans, "how many scans the buffers were given; writing sets the number");
+static unsigned int failing_reads;
+module_param(failing_reads, uint, 0644);
+MODULE_PARM_DESC(failing_reads, "how many of the next reads of a raw value fail, as on a busy bus");
 
 struct mock_channel {
 	int value;
@@ -99,6 +102,10 @@ static int read_raw(struct iio_dev *adc, const struct iio_chan_spec *spec, int *
 
 	switch (mask) {
 	case IIO_CHAN_INFO_RAW:
+		if (failing_reads) {
+			failing_reads--;
+			return -ETIMEDOUT;
+		}
 		*val = mock->channels[spec->channel].value;
 		return IIO_VAL_INT;
 	case IIO_CHAN_INFO_SAMP_FREQ:

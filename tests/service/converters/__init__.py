@@ -6,8 +6,6 @@ import subprocess
 from pathlib import Path
 from typing import Any, Optional
 
-import pytest
-
 from gpio_tree import GpioTree
 from harness import DBusError, Device, hwdesc, port, wait_for
 
@@ -34,9 +32,12 @@ def supervised(
 def expect_supervised_error(
     device: Device, name: str, message: str, method: str, signature: str = "", *args: Any
 ) -> None:
-    with pytest.raises(DBusError) as caught:
-        supervised(device, method, signature, *args)
-    assert (caught.value.name, caught.value.message) == (ERROR + name, message)
+    try:
+        reply = supervised(device, method, signature, *args)
+    except DBusError as caught:
+        assert (caught.name, caught.message) == (ERROR + name, message)
+    else:
+        raise AssertionError(f"{method} answered {reply} instead of the error {name}")
 
 
 def readout(device: Device, number: int = 0) -> tuple[str, int]:
@@ -172,6 +173,14 @@ class Converters:
             path.write_text(text)
             path.chmod(0o666)
         return path
+
+    def keep_from_account(self, entry: str) -> None:
+        """The rights that the kernel gives the device by itself: only root may open and write."""
+        for file in (self.iio / entry).rglob("*"):
+            if file.is_file():
+                file.chmod(0o644)
+        for node in self.folder.glob(f"{entry}*"):
+            node.chmod(0o600)
 
     def level(self, entry: str, name: str, level: int) -> None:
         """In one step: the daemon may read at any time."""

@@ -7,13 +7,14 @@ when the harness itself is killed.
 from .bus import DBusError, Mock, Pending, Signals, SystemBus
 from .device import Device, PortChanged, PortProps, default_binary
 from .documents import hwdesc, port
-from .sandbox import Sandbox, become_root, is_real_root
+from .sandbox import NoMounts, Sandbox, become_root, is_real_root
 from .waiting import scale, wait_for
 
 __all__ = [
     "DBusError",
     "Device",
     "Mock",
+    "NoMounts",
     "Pending",
     "PortChanged",
     "PortProps",

@@ -1,6 +1,7 @@
 """The device's private system bus: its daemon, a client's view of it, and mocked neighbours."""
 
 import os
+import signal
 import subprocess
 from pathlib import Path
 from typing import Any, Callable, Optional
@@ -191,6 +192,7 @@ class SystemBus:
     def __init__(self, sandbox: Sandbox, policies: list[Path]):
         self._sandbox = sandbox
         self._policies = policies
+        self._config = _CONFIG
         self._process: Optional[subprocess.Popen] = None
         self._connection: Optional[Gio.DBusConnection] = None
         self._mocks: list[Mock] = []
@@ -205,17 +207,22 @@ class SystemBus:
         target.parent.mkdir(parents=True, exist_ok=True)
         target.write_text(text)
 
+    def use_config(self, text: str) -> None:
+        """Rules in place of the harness's own; to be called before the bus starts."""
+        assert self._process is None, "the bus runs already"
+        self._config = text
+
     def start(self) -> None:
         if self._process is not None:
             return
-        self._write("/etc/dbus-1/system.conf", _CONFIG)
+        self._write("/etc/dbus-1/bus.conf", self._config)
         for policy in self._policies:
             self._write(f"{_POLICY_FOLDER}/{policy.name}", policy.read_text())
         self._sandbox.under_root(SOCKET).parent.mkdir(parents=True, exist_ok=True)
         with self._sandbox.under_root("/run/bus.log").open("wb") as log:
             self._process = self._sandbox.spawn(
                 ["dbus-daemon", "--nofork", "--nopidfile", "--nosyslog",
-                 "--config-file=/etc/dbus-1/system.conf", "--print-address"],
+                 "--config-file=/etc/dbus-1/bus.conf", "--print-address"],
                 {"PATH": os.environ["PATH"]}, subprocess.PIPE, log,
             )  # fmt: skip
         assert self._process.stdout is not None
@@ -285,6 +292,15 @@ class SystemBus:
         self._mocks.append(Mock(self, name, path, interface, log))
         return self._mocks[-1]
 
+    def pause(self) -> None:
+        """The bus takes nothing and answers nothing, until it is resumed or stopped."""
+        assert self._process is not None
+        self._process.send_signal(signal.SIGSTOP)
+
+    def resume(self) -> None:
+        assert self._process is not None
+        self._process.send_signal(signal.SIGCONT)
+
     def kill(self) -> None:
         """The bus goes away under its clients."""
         assert self._process is not None
@@ -295,6 +311,8 @@ class SystemBus:
         for mock in self._mocks:
             mock.stop()
         self._mocks.clear()
+        if self._process is not None:
+            self.resume()
         if self._connection is not None and not self._connection.is_closed():
             self._connection.close_sync(None)
         self._connection = None

@@ -6,7 +6,7 @@ import signal
 import subprocess
 from functools import lru_cache
 from pathlib import Path
-from typing import Any, NamedTuple, Optional
+from typing import Any, NamedTuple, Optional, Sequence
 
 from .bus import Mock, Pending, Signals, SystemBus
 from .sandbox import Sandbox, is_real_root
@@ -27,10 +27,11 @@ _GROUP = "root:x:0:\nnogroup:x:65534:\n"
 _PCD_USER = f"pcd:x:{PCD_ID}:{PCD_ID}::/run/portd:/bin/false\n"
 _PCD_GROUP = f"pcd:x:{PCD_ID}:\n"
 
-# The folders that an installed system has, and those of them that the service account may write.
-_PCD_FOLDERS = ("/etc/portd", FRAGMENTS)
+# The folders that an installed system has, and the one of them that the service account may write.
+_PCD_FOLDER = "/etc/portd"
 _FOLDERS = (
-    *_PCD_FOLDERS,
+    _PCD_FOLDER,
+    FRAGMENTS,
     "/etc/dynamic/portd",
     "/etc/service_registry/services.d",
     "/etc/legacyconfig/legacymappings.d",
@@ -112,6 +113,8 @@ class Device:
         self._process: Optional[subprocess.Popen] = None
         self._runs = 0
         self._allowed_criticals: list[str] = []
+        # What a test adds to the daemon's environment, from its next start on.
+        self.environment: dict[str, str] = {}
         self._problems: list[str] = []
         self._furnish(pcd_user, pcd_group)
 
@@ -128,7 +131,7 @@ class Device:
         for path in _FOLDERS:
             folder = self.sandbox.under_root(path)
             folder.mkdir(parents=True)
-            if is_real_root() and path in _PCD_FOLDERS:
+            if is_real_root() and path == _PCD_FOLDER:
                 os.chown(folder, PCD_ID, PCD_ID)
 
     # Files
@@ -171,16 +174,32 @@ class Device:
 
     # Life
 
-    def start(self, *args: str, wait: bool = True) -> "Device":
-        """Starts the daemon and, unless told otherwise, waits until it serves calls."""
+    def start(
+        self, *args: str, wait: bool = True, bus: bool = True, launcher: Sequence[str] = (),
+        stdout: Optional[int] = None,
+    ) -> "Device":  # fmt: skip
+        """Starts the daemon and, unless told otherwise, waits until it serves calls.
+
+        `launcher` is a command that becomes the daemon; `stdout` takes the log in place of a file.
+        """
         assert self._process is None, "the daemon runs already"
-        self.bus.start()
+        if bus:
+            self.bus.start()
         self._runs += 1
+        argv = [*launcher, _BINARY, *args]
         with self._output("out").open("wb") as out, self._output("err").open("wb") as err:
-            self._process = self.sandbox.spawn([_BINARY, *args], self._environment(), out, err)
+            output = out if stdout is None else stdout
+            self._process = self.sandbox.spawn(argv, self._environment(), output, err)
         if wait:
-            self._wait_up()
+            self.wait_up()
         return self
+
+    def start_another(self, *args: str) -> tuple[subprocess.Popen, Path]:
+        """A second instance beside the daemon, which the test has to end, and its log."""
+        log = self.folder / "another.out"
+        with log.open("wb") as out:
+            argv = [_BINARY, *args]
+            return self.sandbox.spawn(argv, self._environment(), out, subprocess.DEVNULL), log
 
     def _environment(self) -> dict[str, str]:
         env = {name: os.environ[name] for name in _PASSED_ON if name in os.environ}
@@ -189,9 +208,10 @@ class Device:
         env["TSAN_OPTIONS"] = f"suppressions={_SUPPRESSIONS}"
         env["PATH"] = os.environ["PATH"]
         env["DBUS_SYSTEM_BUS_ADDRESS"] = "unix:path=/run/dbus/system_bus_socket"
-        return env
+        return {**env, **self.environment}
 
-    def _wait_up(self) -> None:
+    def wait_up(self) -> None:
+        """Waits until the daemon serves calls."""
         process = self._process
         assert process is not None
         wait_for(
@@ -349,7 +369,24 @@ class Device:
 
     def descriptors(self) -> list[str]:
         """What the daemon's open file descriptors point to."""
-        return [os.readlink(link) for link in Path(f"/proc/{self.pid}/fd").iterdir()]
+        links = []
+        for link in Path(f"/proc/{self.pid}/fd").iterdir():
+            try:
+                links.append(os.readlink(link))
+            except FileNotFoundError:  # closed meanwhile
+                pass
+        # In a chroot the kernel names the files from outside of it.
+        root = os.readlink(f"/proc/{self.pid}/root").rstrip("/")
+        return [link.removeprefix(root) if link.startswith(root + "/") else link for link in links]
+
+    def descriptors_at_rest(self) -> list[str]:
+        """The same once nothing is being stored: settings are stored on a thread of their own."""
+
+        def at_rest() -> list[str]:
+            now = self.descriptors()
+            return [] if any(link.startswith("/etc/") for link in now) else now
+
+        return wait_for(at_rest, "the settings to be stored")
 
     def status(self, field: str) -> str:
         """One field of the kernel's view of the process, such as VmRSS or Uid."""

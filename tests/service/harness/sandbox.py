@@ -45,21 +45,41 @@ def is_real_root() -> bool:
     return os.geteuid() == 0 and int(first[2]) > 1
 
 
+class NoMounts(PermissionError):
+    """Mounting is not allowed here, in no way that is known; the text says what would help."""
+
+    def __init__(self, reason: str):
+        super().__init__(
+            f"mounting in a namespace of its own is not allowed here ({reason}): it takes root with"
+            " CAP_SYS_ADMIN (a container: --privileged), or user namespaces for everybody"
+            " (sysctl kernel.unprivileged_userns_clone=1)"
+        )
+
+
+def _why_no_mount() -> str:
+    """Why no mount namespace can be made and mounted in, or nothing."""
+    probe = ["unshare", "-m", "mount", "-n", "-t", "tmpfs", "tmpfs", "/tmp"]
+    return subprocess.run(probe, stderr=subprocess.PIPE, text=True).stderr.strip()
+
+
 def become_root() -> None:
-    """Makes an ordinary user root of a user namespace of its own, in which mounting is allowed.
+    """Makes who may not mount root of a user namespace of its own, in which mounting is allowed.
 
     To be called before the first thread is started: a process with several threads can't do it.
+    Raises NoMounts.
     """
-    if os.geteuid() == 0:
+    reason = _why_no_mount() if os.geteuid() == 0 else ""
+    if os.geteuid() == 0 and not reason:
         return
     uid, gid = os.geteuid(), os.getegid()
     libc = ctypes.CDLL(None, use_errno=True)
     if libc.unshare(_CLONE_NEWUSER) != 0:
-        reason = os.strerror(ctypes.get_errno())
-        raise PermissionError(f"neither root nor allowed to make a user namespace: {reason}")
+        raise NoMounts(reason or f"unshare: {os.strerror(ctypes.get_errno())}")
     Path("/proc/self/setgroups").write_text("deny")
     Path("/proc/self/uid_map").write_text(f"0 {uid} 1")
     Path("/proc/self/gid_map").write_text(f"0 {gid} 1")
+    if reason := _why_no_mount():
+        raise NoMounts(reason)
 
 
 class Sandbox:
@@ -135,17 +155,20 @@ class Sandbox:
             raise RuntimeError(f"could not make the private mount namespace: {reason}")
 
     def spawn(
-        self, argv: Sequence[str], env: Mapping[str, str], stdout: IO | int, stderr: IO | int
-    ) -> subprocess.Popen:
+        self, argv: Sequence[str], env: Mapping[str, str], stdout: IO | int, stderr: IO | int,
+        stdin: IO | int = subprocess.DEVNULL,
+    ) -> subprocess.Popen:  # fmt: skip
         """Starts a program inside; the Popen's pid is the program's own, as nothing forks between.
 
         Each has a session of its own, so that an interrupt from the terminal reaches only the
         harness, which then ends them in order.
         """
         self.start()
+        # In a chroot, the root of the namespace is not the one that the device's folders are in.
+        root = f"/proc/{self.pid}/root"
         return subprocess.Popen(
-            ["nsenter", f"--mount=/proc/{self.pid}/ns/mnt", "--", *argv],
-            stdin=subprocess.DEVNULL,
+            ["nsenter", f"--mount=/proc/{self.pid}/ns/mnt", f"--root={root}", f"--wd={root}", "--", *argv],
+            stdin=stdin,
             stdout=stdout,
             stderr=stderr,
             env=dict(env),

@@ -8,13 +8,17 @@
 #include <ostream>
 #include <utility>
 
+#include "backends/iobox-backend.h"
 #include "fake-io-box.h"
-#include "supervised/supervised-backends.h"
+#include "port/ioport-private.h"
 #include "support/fake-ioctl.h"
+
+extern const PortFunctions kToyBackend;
 
 namespace {
 
 constexpr unsigned int kActiveLevel = 150;
+constexpr std::size_t kSharedProxies = 1;  // all ports on boxes have one
 constexpr unsigned int kRestingLevel = 250;
 
 std::vector<Property> join(std::vector<Property> first, const std::vector<Property> &second) {
@@ -39,57 +43,61 @@ std::vector<Property> ranges() {
           {"range", "state", "open"},   {"range", "lower", "201"}, {"range", "upper", "300"}};
 }
 
+// Where the next backend would be in the table.
+constexpr auto kToyKind = static_cast<BackendKind>(BACKEND_CHECK + 1);
+constexpr Backend kToyRow = {"toy", kToyKind, &kToyBackend};
+
 const std::vector<BackendUnderTest> kPlain = {
-    {.name = "virtual", .word = "virtual", .kind = 0, .make = virtual_backend_functions},
+    {.name = "virtual", .word = "virtual", .kind = BACKEND_VIRTUAL},
     {.name = "gpio",
      .word = "gpio",
-     .kind = 1,
-     .make = gpio_backend_functions,
+     .kind = BACKEND_GPIO,
      .properties = &World::lines,
      .activate = &World::raise_line},
     {.name = "spiadc",
      .word = "spiadc",
-     .kind = 2,
-     .make = spiadc_backend_functions,
+     .kind = BACKEND_SPIADC,
      .furnish = &World::make_spidev,
      .properties = &World::converter,
      .activate = &World::raise_spi_level,
      .type = PORT_INPUT},
     {.name = "sysfs",
      .word = "sysfs",
-     .kind = 6,
-     .make = sysfs_backend_functions,
+     .kind = BACKEND_SYSFS,
      .furnish = &World::make_flag,
      .properties = &World::flag,
      .activate = &World::raise_flag,
      .type = PORT_INPUT},
-    {.name = "null", .word = "null", .kind = 8, .make = null_backend_functions},
-    {.name = "check", .word = "check", .kind = 9, .make = check_backend_functions},
+    {.name = "null", .word = "null", .kind = BACKEND_NULL},
+    {.name = "check", .word = "check", .kind = BACKEND_CHECK},
+    {.name = "toy",
+     .word = "toy",
+     .kind = kToyKind,
+     .furnish = &World::make_flag,
+     .properties = &World::toy_file,
+     .activate = &World::raise_flag,
+     .type = PORT_INPUT},
 };
 
 // Unsupervised at first: their plain pin is watched.
 const std::vector<BackendUnderTest> kSupervisable = {
     {.name = "spi",
      .word = "spi",
-     .kind = 3,
-     .make = supervised_spi_backend_functions,
+     .kind = BACKEND_SPI,
      .furnish = &World::make_spidev,
      .properties = &World::supervised_spi,
      .activate = &World::raise_line,
-     .supervisable = true,
-     .keeps_open = "spidev"},
+     .supervisable = true},
     {.name = "iio",
      .word = "iio",
-     .kind = 4,
-     .make = supervised_iio_backend_functions,
+     .kind = BACKEND_IIO,
      .furnish = &World::make_buffered,
      .properties = &World::supervised_iio,
      .activate = &World::raise_line,
      .supervisable = true},
     {.name = "iio_interrupt",
      .word = "iio-interrupt",
-     .kind = 5,
-     .make = supervised_iio_interrupt_backend_functions,
+     .kind = BACKEND_IIO_INTERRUPT,
      .furnish = &World::make_comparator,
      .properties = &World::supervised_interrupt,
      .activate = &World::raise_line,
@@ -97,8 +105,7 @@ const std::vector<BackendUnderTest> kSupervisable = {
      .drops = true},
     {.name = "iobox",
      .word = "iobox",
-     .kind = 7,
-     .make = iobox_backend_functions,
+     .kind = BACKEND_IOBOX,
      .furnish = &World::make_box,
      .activate = &World::raise_box_state,
      .supervisable = true},
@@ -116,6 +123,7 @@ BackendUnderTest measured(BackendUnderTest row, const char *name, void (World::*
 // --- Hardware ---
 
 World::World() {
+  io_port_register_backend(kToyRow);
   fake_spidev() = {};
   fake_io_box() = {};
   set_spi_level(kRestingLevel);
@@ -150,6 +158,10 @@ std::vector<Property> World::lines() const {
 
 std::vector<Property> World::flag() const {
   return {{"device", "path", path("flag")}, {"device", "timeout", "1"}};
+}
+
+std::vector<Property> World::toy_file() const {
+  return {{"file", "path", path("flag")}};
 }
 
 std::vector<Property> World::converter() const {
@@ -230,59 +242,62 @@ void PrintTo(const Held &held, std::ostream *out) {  // NOLINT(readability-ident
 
 // --- Ports ---
 
-Backend::Backend() {
+BackendContract::BackendContract() {
   (this->*GetParam().furnish)();
   before_ = held();
 }
 
-void Backend::appear() {
+void BackendContract::appear() {
   for (const int line : {1, 2, 3, 4}) {
     make_line(line);
   }
   (this->*GetParam().furnish)();
 }
 
-IOPortRef Backend::described() const {
+IOPortRef BackendContract::described() const {
   auto port = make_port(GetParam().kind, GetParam().type, (this->*GetParam().properties)());
   io_port_restore_supervised(port.get(), GetParam().measured);
   return port;
 }
 
-IOPortRef Backend::set_up() const {
+IOPortRef BackendContract::set_up() const {
   auto port = described();
   EXPECT_TRUE(io_port_setup(port.get()));
   return port;
 }
 
-IOPortRef Backend::watched() const {
+IOPortRef BackendContract::watched() const {
   auto port = set_up();
   io_port_set_watch(port.get());
   return port;
 }
 
-const PortFunctions &Backend::table() {
-  const IOPortRef port(io_port_new());
-  const PortFunctions *functions = GetParam().make(port.get());
-  io_port_set_backend_data(port.get(), nullptr);
-  return *functions;
-}
-
-Held Backend::held() const {
-  const char *kept = GetParam().keeps_open;
-  return {.sources = sources(),
-          .watched = watched_files(),
-          .files = descriptors() - (kept ? descriptors(kept) : 0),
-          .io_box_proxies = io_box_proxies()};
-}
-
-void Backend::expect_given_back() const {
-  EXPECT_EQ(held(), before_);
-  if (GetParam().keeps_open) {
-    EXPECT_LE(descriptors(GetParam().keeps_open), 1U);
+// Returns when the box has answered everything, and the main loop has taken it.
+void BackendContract::settle_box() {
+  const auto port = make_port(BACKEND_IOBOX, PORT_OUTPUT, {});
+  io_port_set_number(port.get(), kSilentBoxPort);
+  static_cast<IoBoxBackendData *>(io_port_backend_data(port.get()))->connected = true;
+  port->functions->set_direction(port.get(), false);
+  while (port->refcount > 1) {  // the job's is given back on the main loop
+    iterate();
   }
 }
 
-Words Backend::reports_of_activation(const IOPortRef &port) {
+Held BackendContract::held() const {
+  if (GetParam().kind == BACKEND_IOBOX) {
+    settle_box();
+  }
+  return {.sources = sources(),
+          .watched = watched_files(),
+          .files = descriptors(),
+          .io_box_proxies = io_box_proxies() > kSharedProxies ? io_box_proxies() : 0};
+}
+
+void BackendContract::expect_given_back() const {
+  EXPECT_EQ(held(), before_);
+}
+
+Words BackendContract::reports_of_activation(const IOPortRef &port) {
   (void)io_port_get_state(port.get());
   expire_all();
   reports();  // a line that is measured for the first time is news

@@ -5,7 +5,6 @@
 #include <string>
 #include <vector>
 
-#include "backends/tables.h"
 #include "base/unique-fd.h"
 #include "support/iio-bench.h"
 
@@ -29,6 +28,7 @@ class World : public IioBench {
   std::vector<Property> nothing() const { return {}; }
   std::vector<Property> lines() const;
   std::vector<Property> flag() const;
+  std::vector<Property> toy_file() const;
   std::vector<Property> converter() const;
   std::vector<Property> supervised_spi() const;
   std::vector<Property> supervised_iio() const;
@@ -52,8 +52,7 @@ class World : public IioBench {
 struct BackendUnderTest {
   const char *name;  // of the row
   const char *word;  // in the hardware description
-  int kind;
-  MakePortFunctions make;
+  BackendKind kind;
   void (World::*furnish)() = &World::make_nothing;
   std::vector<Property> (World::*properties)() const = &World::nothing;
   void (World::*activate)() = nullptr;  // null: its ports report nothing by themselves
@@ -61,7 +60,6 @@ struct BackendUnderTest {
   bool supervisable = false;            // it has the slots of supervision
   bool measured = false;                // its ports are supervised from the start
   bool drops = false;                   // it has a drop of its own
-  const char *keeps_open = nullptr;     // one descriptor of that file may outlive the port
 };
 
 std::vector<BackendUnderTest> all_backends();
@@ -75,7 +73,7 @@ void PrintTo(const BackendUnderTest &backend,  // NOLINT(readability-identifier-
 struct Held {
   std::size_t sources;         // of the main loop
   Words watched;               // files that the main loop waits for
-  std::size_t files;           // open ones, but for what a backend may keep
+  std::size_t files;           // open ones
   std::size_t io_box_proxies;  // with their signal handlers
 
   bool operator==(const Held &) const = default;
@@ -83,9 +81,9 @@ struct Held {
 void PrintTo(const Held &held, std::ostream *out);  // NOLINT(readability-identifier-naming)
 
 // After each test the ports must have given back everything.
-class Backend : public World, public testing::WithParamInterface<BackendUnderTest> {
+class BackendContract : public World, public testing::WithParamInterface<BackendUnderTest> {
  protected:
-  Backend();
+  BackendContract();
   void TearDown() override { expect_given_back(); }
 
   // --- Ports, numbered 1 ---
@@ -97,11 +95,10 @@ class Backend : public World, public testing::WithParamInterface<BackendUnderTes
   IOPortRef set_up() const;
   IOPortRef watched() const;
 
-  static const PortFunctions &table();
-
   // Everything is there again that vanished.
   void appear();
 
+  static void settle_box();
   Held held() const;
   // Nothing is held but what was before the first port.
   void expect_given_back() const;

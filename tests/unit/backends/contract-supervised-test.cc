@@ -11,7 +11,7 @@ namespace {
 const SupervisedRanges kRanges = {{SUPERVISED_STATE_CUT, 2000, 1000},
                                   {SUPERVISED_STATE_CLOSED, 900, 800}};
 
-class Supervisable : public Backend {
+class Supervisable : public BackendContract {
  protected:
   static IOPortRef dropped(IOPortRef port) {
     io_port_drop(port.get());

@@ -8,23 +8,26 @@
 #include <vector>
 
 #include "contract-fixture.h"
+#include "port/ioport-private.h"
 
 namespace {
 
-constexpr int kCheckKind = 9;
 constexpr PortType kTypes[] = {PORT_INPUT, PORT_OUTPUT, PORT_CONFIGURABLE};
 
-INSTANTIATE_TEST_SUITE_P(Every, Backend, testing::ValuesIn(all_backends()), name_of);
+class EveryBackend : public World {};
 
-TEST_F(Bench, EveryBackendIsUnderTheContract) {
+INSTANTIATE_TEST_SUITE_P(Every, BackendContract, testing::ValuesIn(all_backends()), name_of);
+
+TEST_F(EveryBackend, IsUnderTheContract) {
   constexpr int beyond = 100;
-  std::set<int> registered;
-  for (int kind = -beyond; kind < beyond; ++kind) {
+  std::set<BackendKind> registered;
+  for (int number = -beyond; number < beyond; ++number) {
+    const auto kind = static_cast<BackendKind>(number);
     if (io_port_has_backend(make_port(kind, PORT_INPUT, {}).get())) {
       registered.insert(kind);
     }
   }
-  std::set<int> under_test;
+  std::set<BackendKind> under_test;
   for (const auto &row : all_backends()) {
     under_test.insert(row.kind);
   }
@@ -33,66 +36,64 @@ TEST_F(Bench, EveryBackendIsUnderTheContract) {
 
 // --- The table ---
 
-TEST_P(Backend, IsKnownByItsWordAndKind) {
+TEST_P(BackendContract, IsKnownByItsWordAndKind) {
   EXPECT_EQ(io_port_backend_kind(GetParam().word), GetParam().kind);
   const auto port = described();
   EXPECT_TRUE(io_port_has_backend(port.get()));
   EXPECT_EQ(io_port_get_backend(port.get()), GetParam().kind);
 }
 
-TEST_P(Backend, ServesWhatEveryPortNeeds) {
-  EXPECT_NE(table().setup, nullptr);
-  EXPECT_NE(table().get_state, nullptr);
-  EXPECT_NE(table().set_state, nullptr);
-  EXPECT_NE(table().start_watch, nullptr);
-  EXPECT_NE(table().set_direction, nullptr);
-  EXPECT_NE(table().set_property, nullptr);
-  EXPECT_NE(table().free, nullptr);
-}
-
-TEST_P(Backend, OffersSupervisionOnlyWhereItHasIt) {
+TEST_P(BackendContract, OffersSupervisionOnlyWhereItHasIt) {
+  const auto port = described();
+  const PortFunctions &functions = *port->functions;
   const bool offers = GetParam().supervisable;
-  EXPECT_EQ(table().is_supervisable != nullptr, offers);
-  EXPECT_EQ(table().set_supervised != nullptr, offers);
-  EXPECT_EQ(table().get_supervised_ranges != nullptr, offers);
-  EXPECT_EQ(table().set_supervised_ranges != nullptr, offers);
-  EXPECT_EQ(table().get_supervised_readout != nullptr, offers);
-  EXPECT_EQ(table().drop != nullptr, GetParam().drops);
+  EXPECT_EQ(functions.is_supervisable != nullptr, offers);
+  EXPECT_EQ(functions.set_supervised != nullptr, offers);
+  EXPECT_EQ(functions.get_supervised_ranges != nullptr, offers);
+  EXPECT_EQ(functions.set_supervised_ranges != nullptr, offers);
+  EXPECT_EQ(functions.get_supervised_readout != nullptr, offers);
+  EXPECT_EQ(functions.drop != nullptr, GetParam().drops);
 }
 
-TEST_P(Backend, HasOneTableForAllItsPorts) {
-  EXPECT_EQ(&table(), &table());
+TEST_P(BackendContract, HasOneTableForAllItsPorts) {
+  EXPECT_EQ(described()->functions, fresh()->functions);
 }
 
-TEST_P(Backend, GivesEachPortARecordOfItsOwnOnce) {
+TEST_P(BackendContract, GivesEachPortARecordOfItsOwnOnce) {
   const auto one = described();
   const auto two = described();
   const PortBackendData *record = io_port_backend_data(one.get());
   if (record) {
     EXPECT_NE(record, io_port_backend_data(two.get()));
   }
-  GetParam().make(one.get());
+  io_port_set_backend(one.get(), GetParam().kind);
   EXPECT_EQ(io_port_backend_data(one.get()), record);
 }
 
 // --- A port that nothing was told about ---
 
-TEST_P(Backend, ReadsInactiveBeforeSetUp) {
+TEST_P(BackendContract, ReadsInactiveBeforeSetUp) {
   EXPECT_FALSE(io_port_get_state(fresh().get()));
   EXPECT_FALSE(io_port_get_state(described().get()));
 }
 
-TEST_P(Backend, EnduresEveryRequestOnFreshData) {
+// Whether it was set up or not, the port layer may ask for levels and directions.
+TEST_P(BackendContract, EnduresEveryRequestOnFreshData) {
   const auto port = fresh();
-  (void)table().get_state(port.get());
-  table().set_state(port.get(), 1);
-  table().set_state(port.get(), 0);
-  table().set_direction(port.get(), true);
-  table().set_direction(port.get(), false);
-  table().start_watch(port.get());
+  const PortFunctions &functions = *port->functions;
+  (void)io_port_read_level(port.get());
+  io_port_write_level(port.get(), 1);
+  io_port_write_level(port.get(), 0);
+  if (functions.set_direction) {
+    functions.set_direction(port.get(), true);
+    functions.set_direction(port.get(), false);
+  }
+  if (functions.start_watch) {
+    functions.start_watch(port.get());
+  }
 }
 
-TEST_P(Backend, EnduresEveryRequestToAFreshPortOfAnyType) {
+TEST_P(BackendContract, EnduresEveryRequestToAFreshPortOfAnyType) {
   for (const PortType type : kTypes) {
     const auto port = fresh(type);
     io_port_set_watch(port.get());
@@ -103,7 +104,7 @@ TEST_P(Backend, EnduresEveryRequestToAFreshPortOfAnyType) {
   }
 }
 
-TEST_P(Backend, EnduresASetUpThatWasToldNothing) {
+TEST_P(BackendContract, EnduresASetUpThatWasToldNothing) {
   for (const PortType type : kTypes) {
     const auto port = fresh(type);
     (void)io_port_setup(port.get());
@@ -113,7 +114,7 @@ TEST_P(Backend, EnduresASetUpThatWasToldNothing) {
   }
 }
 
-TEST_P(Backend, EnduresAttributesThatItDoesNotKnow) {
+TEST_P(BackendContract, EnduresAttributesThatItDoesNotKnow) {
   const auto port = described();
   for (const char *section :
        {"", "backend", "device", "input", "output", "io_ctrl", "range", "no-such-section"}) {
@@ -125,7 +126,7 @@ TEST_P(Backend, EnduresAttributesThatItDoesNotKnow) {
   EXPECT_TRUE(io_port_setup(port.get()));
 }
 
-TEST_P(Backend, EnduresAttributesAfterSetUp) {
+TEST_P(BackendContract, EnduresAttributesAfterSetUp) {
   const auto port = watched();
   for (const auto &[section, key, value] : (this->*GetParam().properties)()) {
     io_port_set_backend_property(port.get(), section, key, value.c_str());
@@ -135,7 +136,7 @@ TEST_P(Backend, EnduresAttributesAfterSetUp) {
 
 // --- In service ---
 
-TEST_P(Backend, ServesAPortFromSetUpToItsEnd) {
+TEST_P(BackendContract, ServesAPortFromSetUpToItsEnd) {
   const auto port = watched();
   EXPECT_TRUE(io_port_is_set_up(port.get()));
   EXPECT_FALSE(io_port_get_state(port.get()));
@@ -147,15 +148,15 @@ TEST_P(Backend, ServesAPortFromSetUpToItsEnd) {
   }
 }
 
-TEST_P(Backend, ReportsAChangeOfItsInputOnce) {
+TEST_P(BackendContract, ReportsAChangeOfItsInputOnce) {
   EXPECT_EQ(reports_of_activation(watched()), one_report());
 }
 
-TEST_P(Backend, ReportsNothingBeforeItIsWatched) {
+TEST_P(BackendContract, ReportsNothingBeforeItIsWatched) {
   EXPECT_EQ(reports_of_activation(set_up()), Words{});
 }
 
-TEST_P(Backend, WatchesAPortOnceHoweverOftenItIsArmed) {
+TEST_P(BackendContract, WatchesAPortOnceHoweverOftenItIsArmed) {
   const auto port = watched();
   const Held armed_once = held();
   io_port_set_watch(port.get());
@@ -164,7 +165,7 @@ TEST_P(Backend, WatchesAPortOnceHoweverOftenItIsArmed) {
   EXPECT_EQ(reports_of_activation(port), one_report());
 }
 
-TEST_P(Backend, WatchesTheInputAgainThatWasAnOutput) {
+TEST_P(BackendContract, WatchesTheInputAgainThatWasAnOutput) {
   const auto port = watched();
   const Held armed = held();
   if (GetParam().type == PORT_CONFIGURABLE) {
@@ -177,7 +178,7 @@ TEST_P(Backend, WatchesTheInputAgainThatWasAnOutput) {
 
 // The descriptors that a second set-up opens get other numbers than those of the first, so that one
 // of the first that somebody still waits for is found out.
-TEST_P(Backend, CanBeSetUpAgainWhileItIsWatched) {
+TEST_P(BackendContract, CanBeSetUpAgainWhileItIsWatched) {
   UniqueFd lowest(open("/dev/null", O_RDONLY | O_CLOEXEC));
   const auto port = watched();
   const Held armed = held();
@@ -193,14 +194,14 @@ TEST_P(Backend, CanBeSetUpAgainWhileItIsWatched) {
 
 // --- Out of service ---
 
-TEST_P(Backend, GivesEverythingBackWhenThePortIsDropped) {
+TEST_P(BackendContract, GivesEverythingBackWhenThePortIsDropped) {
   const auto port = watched();
   io_port_drop(port.get());
   expect_given_back();
   EXPECT_EQ(reports_of_activation(port), Words{});
 }
 
-TEST_P(Backend, EnduresEveryRequestToADroppedPort) {
+TEST_P(BackendContract, EnduresEveryRequestToADroppedPort) {
   const auto port = watched();
   io_port_drop(port.get());
   io_port_drop(port.get());
@@ -213,7 +214,7 @@ TEST_P(Backend, EnduresEveryRequestToADroppedPort) {
   expect_given_back();
 }
 
-TEST_P(Backend, BringsADroppedPortBack) {
+TEST_P(BackendContract, BringsADroppedPortBack) {
   const auto port = watched();
   const Held armed = held();
   for (int i = 0; i < 3; ++i) {
@@ -225,7 +226,7 @@ TEST_P(Backend, BringsADroppedPortBack) {
   EXPECT_EQ(reports_of_activation(port), one_report());
 }
 
-TEST_P(Backend, ComesIntoServiceWhenItsHardwareAppears) {
+TEST_P(BackendContract, ComesIntoServiceWhenItsHardwareAppears) {
   vanish();
   const auto port = described();
   (void)io_port_setup(port.get());
@@ -239,7 +240,7 @@ TEST_P(Backend, ComesIntoServiceWhenItsHardwareAppears) {
   EXPECT_EQ(reports_of_activation(port), one_report());
 }
 
-TEST_P(Backend, LosesItsHardwareAndGetsItBack) {
+TEST_P(BackendContract, LosesItsHardwareAndGetsItBack) {
   const auto port = watched();
   vanish();
   (void)io_port_setup(port.get());
@@ -253,19 +254,20 @@ TEST_P(Backend, LosesItsHardwareAndGetsItBack) {
   EXPECT_EQ(reports_of_activation(port), one_report());
 }
 
-TEST_P(Backend, FreesADroppedPortOnce) {
+TEST_P(BackendContract, FreesADroppedPortOnce) {
   auto port = set_up();
   io_port_drop(port.get());
   port.reset();
 }
 
-TEST_P(Backend, MakesWayForAnotherAndTakesThePortBack) {
+TEST_P(BackendContract, MakesWayForAnotherAndTakesThePortBack) {
   const auto port = watched();
-  io_port_set_backend(port.get(), GetParam().kind == kCheckKind ? kVirtualBackend : kCheckKind);
+  io_port_set_backend(port.get(),
+                      GetParam().kind == BACKEND_CHECK ? BACKEND_VIRTUAL : BACKEND_CHECK);
   expect_given_back();
   EXPECT_TRUE(io_port_setup(port.get()));
   io_port_set_backend(port.get(), GetParam().kind);
-  (void)table().get_state(port.get());
+  (void)io_port_read_level(port.get());
 }
 
 }  // namespace

@@ -1,11 +1,16 @@
 #include "fake-io-box.h"
 
+#include <cstdint>
+#include <mutex>
 #include <string_view>
-#include <vector>
+#include <utility>
 
+#include "base/condition.h"
 #include "base/glib-ptr.h"
 
 namespace {
+
+constexpr std::int64_t kPatienceUs = 20'000'000;
 
 std::vector<GDBusProxy *> &proxies() {
   static std::vector<GDBusProxy *> alive;
@@ -16,6 +21,13 @@ void forget(gpointer /*user_data*/, GObject *where_the_object_was) {
   std::erase(proxies(), reinterpret_cast<GDBusProxy *>(where_the_object_was));
 }
 
+// What the threads that call share with the test.
+std::mutex lock;
+MonotonicCondition changed;
+std::vector<std::string> calls;
+int hanging = 0;
+std::string owner = ":1.1";
+
 GVariant *answer(std::string_view method) {
   if (method == "GetIOBoxConnected") {
     return g_variant_new("(b)", TRUE);
@@ -23,7 +35,34 @@ GVariant *answer(std::string_view method) {
   if (method == "GetIOPortStatus") {
     return g_variant_new("(s)", "enabled");
   }
-  return method == "GetIOState" ? g_variant_new("(s)", "open") : g_variant_new("()");
+  return method == "GetIOState" ? g_variant_new("(s)", fake_io_box().state.c_str())
+                                : g_variant_new("()");
+}
+
+void on_cancelled(GCancellable * /*cancellable*/, gpointer /*user_data*/) {
+  const std::lock_guard guard(lock);
+  changed.notify_all();
+}
+
+// The caller holds the lock. False: cancelled.
+bool hang(std::unique_lock<std::mutex> &guard, std::string_view method, GCancellable *cancellable) {
+  if (fake_io_box().hangs_in != method) {
+    return true;
+  }
+  ++hanging;
+  changed.notify_all();
+  guard.unlock();
+  const gulong handler =
+      g_cancellable_connect(cancellable, G_CALLBACK(on_cancelled), nullptr, nullptr);
+  guard.lock();
+  while (fake_io_box().hangs_in == method && !g_cancellable_is_cancelled(cancellable)) {
+    changed.wait(guard);
+  }
+  --hanging;
+  guard.unlock();
+  g_cancellable_disconnect(cancellable, handler);
+  guard.lock();
+  return !g_cancellable_is_cancelled(cancellable);
 }
 
 }  // namespace
@@ -31,6 +70,36 @@ GVariant *answer(std::string_view method) {
 FakeIoBox &fake_io_box() {
   static FakeIoBox box;
   return box;
+}
+
+std::vector<std::string> io_box_calls() {
+  const std::lock_guard guard(lock);
+  return std::exchange(calls, {});
+}
+
+bool io_box_hangs() {
+  const std::int64_t deadline = g_get_monotonic_time() + kPatienceUs;
+  std::unique_lock guard(lock);
+  while (hanging == 0 && g_get_monotonic_time() < deadline) {
+    changed.wait_until(guard, deadline);
+  }
+  return hanging > 0;
+}
+
+void io_box_recovers() {
+  const std::lock_guard guard(lock);
+  fake_io_box().hangs_in.clear();
+  changed.notify_all();
+}
+
+void io_box_restarts() {
+  {
+    const std::lock_guard guard(lock);
+    owner += "1";
+  }
+  for (GDBusProxy *proxy : std::vector<GDBusProxy *>(proxies())) {
+    g_object_notify(G_OBJECT(proxy), "g-name-owner");
+  }
 }
 
 std::size_t io_box_proxies() {
@@ -64,10 +133,29 @@ extern "C" GDBusProxy *g_dbus_proxy_new_for_bus_sync(GBusType /*bus_type*/, GDBu
   return proxy;
 }
 
+extern "C" gchar *g_dbus_proxy_get_name_owner(GDBusProxy * /*proxy*/) {
+  const std::lock_guard guard(lock);
+  return g_strdup(owner.c_str());
+}
+
 extern "C" GVariant *g_dbus_proxy_call_sync(GDBusProxy * /*proxy*/, const gchar *method_name,
                                             GVariant *parameters, GDBusCallFlags /*flags*/,
-                                            gint /*timeout_msec*/, GCancellable * /*cancellable*/,
-                                            GError ** /*error*/) {
+                                            gint /*timeout_msec*/, GCancellable *cancellable,
+                                            GError **error) {
   const GVariantPtr taken(parameters ? g_variant_ref_sink(parameters) : nullptr);
+  const GCharPtr text(taken ? g_variant_print(taken.get(), FALSE) : g_strdup("()"));
+  if (std::string_view(text.get()).starts_with("(" + std::to_string(kSilentBoxPort) + ",")) {
+    return g_variant_ref_sink(answer(method_name));
+  }
+  std::unique_lock guard(lock);
+  if (!fake_io_box().present) {
+    g_set_error_literal(error, G_DBUS_ERROR, G_DBUS_ERROR_SERVICE_UNKNOWN, "There is no service");
+    return nullptr;
+  }
+  calls.push_back(std::string(method_name) + " " + text.get());
+  if (!hang(guard, method_name, cancellable)) {
+    g_set_error_literal(error, G_IO_ERROR, G_IO_ERROR_CANCELLED, "Cancelled");
+    return nullptr;
+  }
   return g_variant_ref_sink(answer(method_name));
 }

@@ -1,32 +1,30 @@
 // The backends without hardware: virtual, null and check.
-#include "backends/tables.h"
+#include "port/ioport-private.h"
 #include "support/port-fixture.h"
 
 namespace {
 
 class MemoryBackends : public PortFixture {
  protected:
-  static std::uint32_t level_after(const IOPortRef &port, MakePortFunctions make,
-                                   std::int32_t level) {
-    const PortFunctions *table = make(port.get());
-    table->set_state(port.get(), level);
-    return table->get_state(port.get());
+  static std::uint32_t level_after(const IOPortRef &port, std::int32_t level) {
+    io_port_write_level(port.get(), level);
+    return io_port_read_level(port.get());
   }
 };
 
 TEST_F(MemoryBackends, VirtualReadsActiveAboveZero) {
-  const auto port = PortBuilder().backend(kVirtualKind).output().set_up();
-  EXPECT_EQ(level_after(port, virtual_backend_functions, 1), 1U);
-  EXPECT_EQ(level_after(port, virtual_backend_functions, 5), 1U);
-  EXPECT_EQ(level_after(port, virtual_backend_functions, INT32_MAX), 1U);
-  EXPECT_EQ(level_after(port, virtual_backend_functions, 0), 0U);
-  EXPECT_EQ(level_after(port, virtual_backend_functions, -1), 0U);
-  EXPECT_EQ(level_after(port, virtual_backend_functions, INT32_MIN), 0U);
+  const auto port = PortBuilder().backend(BACKEND_VIRTUAL).output().set_up();
+  EXPECT_EQ(level_after(port, 1), 1U);
+  EXPECT_EQ(level_after(port, 5), 1U);
+  EXPECT_EQ(level_after(port, INT32_MAX), 1U);
+  EXPECT_EQ(level_after(port, 0), 0U);
+  EXPECT_EQ(level_after(port, -1), 0U);
+  EXPECT_EQ(level_after(port, INT32_MIN), 0U);
 }
 
 TEST_F(MemoryBackends, NullReadsInactiveWhateverItIsTold) {
-  const auto port = PortBuilder().backend(kNullKind).output().set_up();
-  EXPECT_EQ(level_after(port, null_backend_functions, 1), 0U);
+  const auto port = PortBuilder().backend(BACKEND_NULL).output().set_up();
+  EXPECT_EQ(level_after(port, 1), 0U);
   EXPECT_TRUE(io_port_set_state(port.get(), true));
   EXPECT_FALSE(io_port_get_state(port.get()));
   EXPECT_EQ(io_port_backend_data(port.get()), nullptr);
@@ -34,9 +32,9 @@ TEST_F(MemoryBackends, NullReadsInactiveWhateverItIsTold) {
 
 TEST_F(MemoryBackends, CheckReadsBackWhatItIsTold) {
   const auto port = PortBuilder().output().set_up();
-  EXPECT_EQ(level_after(port, check_backend_functions, 5), 5U);
-  EXPECT_EQ(level_after(port, check_backend_functions, 0), 0U);
-  EXPECT_EQ(level_after(port, check_backend_functions, -1), UINT32_MAX);
+  EXPECT_EQ(level_after(port, 5), 5U);
+  EXPECT_EQ(level_after(port, 0), 0U);
+  EXPECT_EQ(level_after(port, -1), UINT32_MAX);
 }
 
 TEST_F(MemoryBackends, CheckRecordsNothingAtFirst) {
@@ -79,7 +77,7 @@ TEST_F(MemoryBackends, CheckTakesBackAGoodSetUpWhenTheNextFails) {
 
 TEST_F(MemoryBackends, CheckKeepsCopiesOfItsProperties) {
   const IOPortRef port(io_port_new());
-  io_port_set_backend(port.get(), kCheckKind);
+  io_port_set_backend(port.get(), BACKEND_CHECK);
   {
     std::string section = "s";
     std::string key = "k";

@@ -1,10 +1,14 @@
-// Sysfs ports, read from plain files. Without a time-out in their description they are polled once
-// in every turn of the main context, which is what these tests count on.
+// Sysfs ports, read from plain files.
+#include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <string>
+#include <thread>
 
-#include "backends/tables.h"
+#include "base/unique-fd.h"
+#include "port/ioport-private.h"
 #include "support/file-size-limit.h"
 #include "support/port-fixture.h"
 #include "support/temp-dir.h"
@@ -27,7 +31,10 @@ class Sysfs : public PortFixture {
   }
   static PortBuilder described(const std::string &path, int options = 0) {
     PortBuilder builder;
-    builder.input().backend(kSysfsKind).property("device", "path", path.c_str());
+    builder.input()
+        .backend(BACKEND_SYSFS)
+        .property("device", "path", path.c_str())
+        .property("device", "timeout", "1");
     if (options & kInverted) {
       builder.property("device", "inverted", "true");
     }
@@ -36,10 +43,9 @@ class Sysfs : public PortFixture {
     }
     return builder;
   }
-  static void poll() { g_main_context_iteration(nullptr, FALSE); }
-  static std::uint32_t raw(const IOPortRef &port) {
-    return sysfs_backend_functions(port.get())->get_state(port.get());
-  }
+  // The timer of the port is all that the main context waits for.
+  static void poll() { g_main_context_iteration(nullptr, TRUE); }
+  static std::uint32_t raw(const IOPortRef &port) { return io_port_read_level(port.get()); }
   // The level that one poll of a file with that contents gives.
   std::uint32_t level_of(std::string_view contents, int options = 0) {
     const auto port = watched(dir.write("flag", contents), options);
@@ -257,6 +263,27 @@ TEST_F(Sysfs, OpensItsFileAgainWhenItIsSetUpAgain) {
   EXPECT_EQ(raw(port), 1U);
 }
 
+// Opened without that flag, a pipe that nobody writes to would hold the start for ever.
+TEST_F(Sysfs, OpensAPipeThatNobodyWritesTo) {
+  const std::string pipe = dir.path("pipe");
+  ASSERT_EQ(mkfifo(pipe.c_str(), 0600), 0);
+  const auto port = described(pipe).build();
+  std::atomic<bool> opened = false;
+  std::thread rescuer([&] {
+    // Long for every machine; then the set-up is let go, so that the test ends.
+    for (int tries = 0; !opened && tries < 500; ++tries) {
+      g_usleep(10'000);
+    }
+    if (!opened) {
+      const UniqueFd writer(open(pipe.c_str(), O_WRONLY | O_NONBLOCK | O_CLOEXEC));
+      ADD_FAILURE() << "the set-up waits for a writer";
+    }
+  });
+  EXPECT_TRUE(io_port_setup(port.get()));
+  opened = true;
+  rescuer.join();
+}
+
 TEST_F(Sysfs, SetsUpInputsOnly) {
   const std::string file = dir.write("flag", "1\n");
   const auto output = described(file).output().build();
@@ -268,9 +295,8 @@ TEST_F(Sysfs, SetsUpInputsOnly) {
 
 TEST_F(Sysfs, IgnoresStatesAndDirections) {
   const auto port = watched(dir.write("flag", "0\n"));
-  const PortFunctions *table = sysfs_backend_functions(port.get());
-  table->set_state(port.get(), 1);
-  table->set_direction(port.get(), false);
+  io_port_write_level(port.get(), 1);
+  EXPECT_FALSE(io_port_set_direction(port.get(), false));
   EXPECT_EQ(raw(port), 0U);
   poll();
   EXPECT_EQ(raw(port), 0U);
@@ -312,7 +338,7 @@ TEST_F(Sysfs, TakesAYesBack) {
 
 TEST_F(Sysfs, WarnsOfSectionsThatItDoesNotKnow) {
   const auto port =
-      PortBuilder().backend(kSysfsKind).property("input", "path", "/dev/null").build();
+      PortBuilder().backend(BACKEND_SYSFS).property("input", "path", "/dev/null").build();
   EXPECT_TRUE(log.took_warning("Could not parse backend data!\n"));
   EXPECT_FALSE(io_port_setup(port.get()));
   EXPECT_TRUE(log.took_containing(G_LOG_LEVEL_WARNING, "Failed to open : "));
@@ -328,7 +354,7 @@ TEST_F(Sysfs, IgnoresKeysThatItDoesNotKnow) {
 // When the port is polled next, counted from the moment that its watch was armed.
 std::pair<std::int64_t, std::int64_t> poll_interval_bounds(const char *timeout) {
   const auto port = PortBuilder()
-                        .backend(kSysfsKind)
+                        .backend(BACKEND_SYSFS)
                         .property("device", "path", "/dev/null")
                         .property("device", "timeout", timeout)
                         .set_up();
@@ -352,8 +378,25 @@ TEST_F(Sysfs, PollsAtTheIntervalOfItsDescriptionInTheBaseThatItHas) {
   expect_interval("0x64", 100);
   expect_interval("0144", 100);
   expect_interval("250 ms", 250);
-  expect_interval("soon", 0);
   expect_interval("-1", UINT32_MAX);
+}
+
+TEST_F(Sysfs, PollsAtASensibleIntervalWhereItsDescriptionHasNone) {
+  for (const char *timeout : {"soon", "", "0"}) {
+    expect_interval(timeout, 10);
+    EXPECT_TRUE(log.took_warning(
+        "Port port: no usable polling interval is given; it is polled every 10 ms"));
+  }
+}
+
+TEST_F(Sysfs, GoesOnPollingWhenItIsArmedAnew) {
+  const auto port =
+      described(dir.write("flag", "0")).property("device", "timeout", "60000").set_up();
+  io_port_set_watch(port.get());
+  const GSource *source = g_main_context_find_source_by_user_data(nullptr, port.get());
+  io_port_set_watch(port.get());
+  EXPECT_EQ(g_main_context_find_source_by_user_data(nullptr, port.get()), source)
+      << "its next look must not be put off";
 }
 
 TEST_F(Sysfs, PollsOnceAnIntervalHoweverOftenItIsArmed) {
@@ -372,7 +415,6 @@ TEST_F(Sysfs, StopsPollingWhenItsPortIsFreed) {
   IOPort *gone = port.get();
   port.reset();
   EXPECT_EQ(g_main_context_find_source_by_user_data(nullptr, gone), nullptr);
-  poll();
 }
 
 }  // namespace

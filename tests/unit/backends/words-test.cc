@@ -1,15 +1,13 @@
 // The words that the hardware description has for the backends.
 #include <gtest/gtest.h>
 
-#include "backends/backends.h"
+#include "daemon/backends.h"
 #include "port/ioport.h"
-#include "supervised/supervised-backends.h"
 
 namespace {
 
 TEST(BackendWord, StandsForItsKind) {
   backends_register();
-  supervised_backends_register();
   const std::pair<const char *, int> words[] = {
       {"virtual", 0},       {"gpio", 1},  {"spiadc", 2}, {"spi", 3},  {"iio", 4},
       {"iio-interrupt", 5}, {"sysfs", 6}, {"iobox", 7},  {"null", 8}, {"check", 9}};
@@ -20,7 +18,6 @@ TEST(BackendWord, StandsForItsKind) {
 
 TEST(BackendWord, IsMatchedExactly) {
   backends_register();
-  supervised_backends_register();
   for (const char *word : {"", "GPIO", "gpio ", " gpio", "iio-", "interrupt", "sys", "checks"}) {
     EXPECT_EQ(io_port_backend_kind(word), std::nullopt) << word;
   }

@@ -3,7 +3,7 @@
 
 #include <gtest/gtest.h>
 
-#include "backends/backends.h"
+#include "daemon/backends.h"
 #include "events/event-values.h"
 #include "events/fake-event-library.h"
 #include "port/port-listener.h"

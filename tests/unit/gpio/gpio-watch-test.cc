@@ -1,7 +1,6 @@
 // Edges of watched lines, up to what becomes of lines that fail.
 #include <cerrno>
 
-#include "backends/tables.h"
 #include "gpio-fixture.h"
 
 namespace {
@@ -176,6 +175,7 @@ TEST_F(GpioBackendTest, AClientWhoseReadFailsDoesNotSwallowTheChange) {
   line("1").read_error = EIO;
   EXPECT_TRUE(io_port_get_state(port()));
   EXPECT_FALSE(line("1").signals());
+  EXPECT_TRUE(g_main_context_iteration(nullptr, FALSE));
   EXPECT_EQ(seams().intervals, std::vector<guint>{1000});
   line("1").read_error = 0;
   serve();
@@ -186,6 +186,7 @@ TEST_F(GpioBackendTest, AClientWhoseReadFailsInventsNoChange) {
   make_watched_input();
   line("1").read_error = EIO;
   EXPECT_TRUE(io_port_get_state(port()));
+  EXPECT_TRUE(g_main_context_iteration(nullptr, FALSE));
   EXPECT_EQ(seams().intervals, std::vector<guint>{1000});
   line("1").read_error = 0;
   serve();
@@ -204,6 +205,22 @@ TEST_F(GpioBackendTest, AfterAnUnacknowledgedFailureTheWatchComesBackWithTheLine
   serve();
   EXPECT_EQ(seams().alive_fd_watches(), 1);
   EXPECT_EQ(take_reported(), (States{true, false}));
+  EXPECT_TRUE(log.took_warning("Port terminal: the line can't be read"));
+}
+
+// The line may have moved there and back meanwhile.
+TEST_F(GpioBackendTest, ALineThatWasNotFollowedForAWhileIsReportedAnew) {
+  make_watched_input();
+  line("1").script = {1, -1};
+  line("1").acknowledges = false;
+  line("1").edge(1);
+  EXPECT_TRUE(g_main_context_iteration(nullptr, FALSE));
+  EXPECT_EQ(take_reported(), States{true});
+  EXPECT_EQ(seams().alive_fd_watches(), 0);
+  line("1").acknowledges = true;
+  serve();
+  EXPECT_EQ(take_reported(), States{true});
+  EXPECT_EQ(seams().alive_fd_watches(), 1);
   EXPECT_TRUE(log.took_warning("Port terminal: the line can't be read"));
 }
 

@@ -256,8 +256,8 @@ TEST_F(SpiAdcBackendTest, AMissingDeviceFailsTheSetUp) {
 }
 
 TEST_F(SpiAdcBackendTest, ADeviceThatDidNotOpenIsSampledAsZero) {
-  EXPECT_FALSE(
-      io_port_setup(make(join({{"device", "device", "/nonexistent"}}, range("0", "9", "0")))));
+  EXPECT_FALSE(io_port_setup(make(join(
+      {{"device", "device", "/nonexistent"}, {"device", "timeout", "50"}}, range("0", "9", "0")))));
   fake_spidev().error = EBADF;
   io_port_set_watch(port());
   EXPECT_TRUE(sample_once());

@@ -1,5 +1,7 @@
 #include <fcntl.h>
 
+#include <functional>
+
 #include "ugpio-fixture.h"
 
 namespace {
@@ -171,47 +173,41 @@ TEST_F(UgpioHostTest, TheFilesOfAFreshLineAreWaitedFor) {
   EXPECT_TRUE(request(kInput));
 }
 
-TEST_F(UgpioHostTest, TheRightsToAFreshLineAreWaitedFor) {
-  tree.exports = false;
-  tree.set_mode("class/gpio/export", 0666);
-  tree.on_sleep = [this] {
-    const Privileged owner;
-    if (tree.slept == 1'000) {
-      tree.make_line("12");
-      set_line_modes(0);
-    } else if (tree.slept == 20'000) {
-      set_line_modes(0666);
+// A line that appears after 1 ms, without the rights that `withhold` takes away until 20 ms.
+class UgpioLateRightsTest : public UgpioHostTest {
+ protected:
+  void expect_rights_are_waited_for(const std::function<void()> &withhold) {
+    tree.exports = false;
+    tree.set_mode("class/gpio/export", 0666);
+    tree.on_sleep = [this, &withhold] {
+      const Privileged owner;
+      if (tree.slept == 1'000) {
+        tree.make_line("12");
+        withhold();
+      } else if (tree.slept == 20'000) {
+        set_line_modes(0666);
+      }
+    };
+    ContextPtr context;
+    {
+      const Unprivileged nobody;
+      context = request(kInput);
     }
-  };
-  ContextPtr context;
-  {
-    const Unprivileged nobody;
-    context = request(kInput);
+    EXPECT_TRUE(context);
+    EXPECT_EQ(tree.slept, 20'000);
+    tree.on_sleep = nullptr;
   }
-  EXPECT_TRUE(context);
-  EXPECT_EQ(tree.slept, 20'000);
+};
+
+TEST_F(UgpioLateRightsTest, TheRightsToAFreshLineAreWaitedFor) {
+  expect_rights_are_waited_for([this] { set_line_modes(0); });
 }
 
-TEST_F(UgpioHostTest, TheRightsToTheEdgesAreWaitedForEvenWhenTheDirectionCouldBeWritten) {
-  tree.exports = false;
-  tree.set_mode("class/gpio/export", 0666);
-  tree.on_sleep = [this] {
-    const Privileged owner;
-    if (tree.slept == 1'000) {
-      tree.make_line("12");
-      set_line_modes(0666);
-      tree.set_mode("class/gpio/gpio12/edge", 0);
-    } else if (tree.slept == 20'000) {
-      set_line_modes(0666);
-    }
-  };
-  ContextPtr context;
-  {
-    const Unprivileged nobody;
-    context = request(kInput);
-  }
-  EXPECT_TRUE(context);
-  EXPECT_EQ(tree.slept, 20'000);
+TEST_F(UgpioLateRightsTest, TheRightsToTheEdgesAreWaitedForEvenWhenTheDirectionCouldBeWritten) {
+  expect_rights_are_waited_for([this] {
+    set_line_modes(0666);
+    tree.set_mode("class/gpio/gpio12/edge", 0);
+  });
 }
 
 TEST_F(UgpioHostTest, ALineThatNeverAppearsIsNotWaitedForLong) {

@@ -83,12 +83,26 @@ TEST_F(Documents, ThatAreMissingAreCritical) {
   EXPECT_TRUE(took_load_failure(dir.path()));
 }
 
-TEST_F(Documents, ThatHoldNothingAreCritical) {
-  for (const char *text : {"", "   \n", "no markup"}) {
-    EXPECT_FALSE(load(text)) << text;
-    EXPECT_TRUE(took_parse_failure()) << text;
+TEST_F(Documents, ThatHoldNothingSayNothing) {
+  for (const char *text : {"", "   \n"}) {
+    EXPECT_TRUE(load(text)) << text;
   }
   EXPECT_EQ(port_registry_count(), 0U);
+}
+
+TEST_F(Documents, ThatAreNoMarkupAreCritical) {
+  EXPECT_FALSE(load("no markup"));
+  EXPECT_TRUE(took_parse_failure());
+  EXPECT_EQ(port_registry_count(), 0U);
+}
+
+TEST_F(Documents, ThatAreMalformedAreToldWithPlaceAndReason) {
+  EXPECT_FALSE(load("<ports>\n <port name='a'/>\n</port>\n"));
+  EXPECT_TRUE(log.took_critical("Couldn't parse markup file (" + dir.path("conf.xml") + ")\n"));
+  const auto told = log.take_warnings();
+  ASSERT_EQ(told.size(), 1U);
+  EXPECT_EQ(told.front().find(dir.path("conf.xml") + ":3:"), 0U) << told.front();
+  EXPECT_EQ(told.front().find("Error on line"), std::string::npos) << told.front();
 }
 
 TEST_F(Documents, ThatAreMalformedKeepWhatStoodBefore) {

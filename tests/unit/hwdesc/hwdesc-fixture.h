@@ -29,8 +29,10 @@ class HardwareDescription : public PortFixture {
     }
     return ids;
   }
+  // What is said of a document that can't be parsed: that, and then where and why.
   bool took_parse_failure(const std::string &path) {
-    return log.took_critical("Couldn't parse markup file (" + path + ")\n");
+    return log.took_critical("Couldn't parse markup file (" + path + ")\n") &&
+           log.took_containing(G_LOG_LEVEL_WARNING, path + ":");
   }
   bool took_parse_failure() { return took_parse_failure(dir.path("conf.xml")); }
 };

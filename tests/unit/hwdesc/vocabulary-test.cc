@@ -177,7 +177,7 @@ TEST_F(Vocabulary, LetsASecondBackendReplaceTheFirst) {
   EXPECT_TRUE(properties_of("<backend name='sysfs'><device path='/dev/null'/></backend>"
                             "<backend name='check'/>")
                   .empty());
-  EXPECT_EQ(io_port_get_backend(port().get()), kCheckKind);
+  EXPECT_EQ(io_port_get_backend(port().get()), BACKEND_CHECK);
 }
 
 // --- event and keyvalue ---

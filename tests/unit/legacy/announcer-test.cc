@@ -1,7 +1,8 @@
 // What becomes of the announcements' handles when the library refuses.
+#include "legacy/announcer.h"
+
 #include <gio/gio.h>
 
-#include "dbus/legacy-announcer.h"
 #include "fixture.h"
 
 namespace {

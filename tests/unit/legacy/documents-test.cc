@@ -1,4 +1,5 @@
-#include "dbus/legacy-documents.h"
+#include "legacy/documents.h"
+
 #include "fixture.h"
 
 namespace {

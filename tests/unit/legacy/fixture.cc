@@ -1,7 +1,7 @@
 #include "fixture.h"
 
-#include "backends/backends.h"
 #include "base/glib-ptr.h"
+#include "daemon/backends.h"
 #include "port/port-registry.h"
 #include "support/port-builder.h"
 

@@ -1,3 +1,8 @@
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <optional>
+
 #include "base/glib-ptr.h"
 #include "fixture.h"
 #include "port/port-error.h"
@@ -263,6 +268,23 @@ TEST_F(ImportTest, lines_may_end_as_elsewhere) {
   EXPECT_EQ(import("[IOPort.I1.Output]\r\nMode=bistable\r\nName=\"Lock\"\r\n"), "");
   EXPECT_EQ(io_port_get_mode(output_), PORT_MODE_BISTABLE);
   EXPECT_EQ(output_name(output_), "Lock");
+}
+
+TEST_F(ImportTest, file_that_is_no_regular_one) {
+  ASSERT_EQ(mkfifo(path_of("pipe").c_str(), 0600), 0);
+  EXPECT_EQ(param_read_parhand(path_of("pipe").c_str()), std::nullopt);
+  EXPECT_TRUE(log().took_warning("Left " + path_of("pipe") + " alone: Not a regular file"));
+  ASSERT_EQ(symlink("export.conf", path_of("link").c_str()), 0);
+  EXPECT_EQ(param_read_parhand(path_of("link").c_str()), std::nullopt);
+  EXPECT_TRUE(log().took_warning("Left " + path_of("link") + " alone: Is a link"));
+}
+
+TEST_F(ImportTest, file_of_the_largest_size) {
+  constexpr std::size_t most = 1'048'576;
+  EXPECT_EQ(param_read_parhand(write_file("large", std::string(most, 'x')).c_str())->size(), most);
+  const std::string larger = write_file("larger", std::string(most + 1, 'x'));
+  EXPECT_EQ(param_read_parhand(larger.c_str()), std::nullopt);
+  EXPECT_TRUE(log().took_warning("Left " + larger + " alone: File too large"));
 }
 
 }  // namespace

@@ -1,12 +1,13 @@
 // Putting the objects on a connection, and the failures that end the daemon.
+#include "legacy/objects.h"
+
 #include <sys/socket.h>
 
 #include <array>
 
-#include "dbus/iocontrol-conf-legacy-dbus.h"
-#include "dbus/legacy-controller.h"
-#include "dbus/legacy-names.h"
 #include "fixture.h"
+#include "legacy/bridge.h"
+#include "legacy/names.h"
 
 namespace {
 

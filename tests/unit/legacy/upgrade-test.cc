@@ -1,3 +1,5 @@
+#include <string>
+
 #include "base/glib-ptr.h"
 #include "base/log.h"
 #include "fixture.h"
@@ -18,14 +20,22 @@ class UpgradeTest : public LegacyTest {
   }
 };
 
+// Where groups are set apart by empty lines differs between versions of GLib.
+std::string without_empty_lines(std::string text) {
+  for (std::size_t end = 0; (end = text.find("\n\n", end)) != std::string::npos;) {
+    text.erase(end, 1);
+  }
+  return text;
+}
+
 TEST_F(UpgradeTest, values_are_copied_as_they_stand) {
   const std::string input =
       write_file("in", "[a]\nkept=no\nraw=\" x\\s;\\\\ \n[b]\nnew=1\nnew[de]=2\n");
   const std::string output = write_file("out", "[a]\n# whether\nkept=yes\nown=1\n[c]\nx=y\n");
   EXPECT_EQ(upgrade(input, output), "");
-  EXPECT_EQ(
-      read_file(output),
-      "[a]\n# whether\nkept=no\nown=1\nraw=\" x\\s;\\\\ \n\n[c]\nx=y\n\n[b]\nnew=1\nnew[de]=2\n");
+  EXPECT_EQ(without_empty_lines(read_file(output)),
+            "[a]\n# whether\nkept=no\nown=1\nraw=\" x\\s;\\\\ \n"
+            "[c]\nx=y\n[b]\nnew=1\nnew[de]=2\n");
 }
 
 TEST_F(UpgradeTest, input_that_is_not_there) {

@@ -4,15 +4,15 @@
 #include <string>
 #include <vector>
 
-#include "backends/backends.h"
 #include "backends/iobox-backend.h"
-#include "backends/tables.h"
+#include "backends/iobox-calls.h"
+#include "daemon/backends.h"
+#include "port/ioport-private.h"
 #include "port/port-listener.h"
 #include "support/log-capture.h"
 
 namespace {
 
-constexpr int kIoBox = 7;
 constexpr int kNumber = 4;
 
 std::vector<PortChange> changes;
@@ -28,8 +28,8 @@ class IoBox : public testing::Test {
     port_listener().port_changed = keep_change;
     backends_register();
     io_port_set_number(port(), kNumber);
-    io_port_set_backend(port(), kIoBox);
-    table_ = iobox_backend_functions(port());
+    io_port_set_backend(port(), BACKEND_IOBOX);
+    table_ = port()->functions;
   }
   void TearDown() override { port_listener() = {}; }
 

@@ -5,8 +5,6 @@
 
 namespace {
 
-constexpr int kCheckBackend = 9;
-
 // A backend that asks the registry while it is set up, as an event library may.
 constexpr PortFunctions kCuriousFunctions = {
     .setup =
@@ -17,18 +15,16 @@ constexpr PortFunctions kCuriousFunctions = {
     .get_state = [](IOPort * /*port*/) { return 0U; },
 };
 
-const PortFunctions *curious_backend(IOPort * /*port*/) {
-  return &kCuriousFunctions;
-}
-
 TEST(RegistryPasses, LeaveTheRegistryFreeWhileABackendIsSetUp) {
-  io_port_register_backend(kCheckBackend, curious_backend);
+  io_port_register_backend({"curious", BACKEND_CHECK, &kCuriousFunctions});
   IOPortRef port(io_port_new());
   io_port_set_optional(port.get(), true);
-  io_port_set_backend(port.get(), kCheckBackend);
+  io_port_set_backend(port.get(), BACKEND_CHECK);
   port_registry_add(port.get());
   port_registry_park(port.get());
-  EXPECT_EQ(port_registry_retry_parked(), 1U);
+  std::size_t back = 0;
+  port_registry_retry_parked([&](std::size_t count) { back = count; });
+  EXPECT_EQ(back, 1U);
   port_registry_setup_all();
   EXPECT_TRUE(io_port_is_set_up(port.get()));
   port.reset();

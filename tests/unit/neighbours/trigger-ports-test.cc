@@ -8,7 +8,7 @@
 #include <string>
 #include <vector>
 
-#include "backends/backends.h"
+#include "daemon/backends.h"
 #include "port/ioport.h"
 #include "port/port-listener.h"
 #include "port/port-registry.h"

@@ -1,10 +1,12 @@
 #include "platform/confutils.h"
 
+#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include "base/glib-ptr.h"
+#include "base/unique-fd.h"
 #include "support/file-size-limit.h"
 #include "support/recording-listener.h"
 #include "support/temp-dir.h"
@@ -113,6 +115,110 @@ TEST(Confutils, ReplacesTheFileThatALinkNamesAndKeepsTheLink) {
   ASSERT_EQ(lstat(link.c_str(), &status), 0);
   EXPECT_TRUE(S_ISLNK(status.st_mode));
   EXPECT_EQ(dir.names(), (Lines{"elsewhere", "link"}));
+}
+
+// --- Contents that are on storage already ---
+
+ino_t inode_of(const std::string &path) {
+  struct stat status {};
+  EXPECT_EQ(stat(path.c_str(), &status), 0);
+  return status.st_ino;
+}
+
+// Whether a file of the contents is replaced when these contents are asked for.
+bool replaces(const std::string &file, std::string_view contents) {
+  // A file's number may be given to the next one, unless something still has the old file.
+  const UniqueFd old(open(file.c_str(), O_RDONLY | O_CLOEXEC));
+  const ino_t before = inode_of(file);
+  Error error;
+  EXPECT_TRUE(set_contents(file, contents, error));
+  return inode_of(file) != before;
+}
+
+TEST(Confutils, LeavesAFileAloneThatItSyncedWithTheseContents) {
+  const TempDir dir;
+  const std::string file = dir.path("file");
+  Error error;
+  EXPECT_TRUE(set_contents(file, "text", error));
+  EXPECT_FALSE(replaces(file, "text"));
+  EXPECT_TRUE(replaces(file, "tex2"));
+  EXPECT_FALSE(replaces(file, "tex2"));
+  EXPECT_TRUE(replaces(file, "text"));
+  EXPECT_EQ(dir.names(), Lines{"file"});
+}
+
+TEST(Confutils, LeavesAFileAloneWhoeverOwnsItNow) {
+  const TempDir dir;
+  const std::string file = dir.path("file");
+  Error error;
+  EXPECT_TRUE(set_contents(file, "text", error));
+  (void)chown(file.c_str(), kSomeone, kSomeGroup);
+  ASSERT_EQ(chmod(file.c_str(), 0600), 0);
+  EXPECT_FALSE(replaces(file, "text"));
+}
+
+TEST(Confutils, ReplacesTheSameContentsThatSomebodyElseWrote) {
+  const TempDir dir;
+  const std::string file = dir.write("file", "text");
+  EXPECT_TRUE(replaces(file, "text"));
+  EXPECT_FALSE(replaces(file, "text"));
+  ASSERT_EQ(unlink(file.c_str()), 0);
+  dir.write("file", "text");
+  EXPECT_TRUE(replaces(file, "text"));
+}
+
+TEST(Confutils, IsNotTakenInByATimeOfLastChangeThatLies) {
+  const TempDir dir;
+  const std::string file = dir.write("file", "text");
+  const timespec long_ago[2] = {};
+  ASSERT_EQ(utimensat(AT_FDCWD, file.c_str(), long_ago, 0), 0);
+  EXPECT_TRUE(replaces(file, "text"));
+}
+
+TEST(Confutils, RemembersWhatItSyncedWhateverTheClockSays) {
+  const TempDir dir;
+  const std::string file = dir.path("file");
+  Error error;
+  EXPECT_TRUE(set_contents(file, "text", error));
+  const timespec years_ahead[2] = {{.tv_sec = 2'000'000'000, .tv_nsec = 0},
+                                   {.tv_sec = 2'000'000'000, .tv_nsec = 0}};
+  ASSERT_EQ(utimensat(AT_FDCWD, file.c_str(), years_ahead, 0), 0);
+  EXPECT_TRUE(replaces(file, "text"));  // not what it left
+  EXPECT_FALSE(replaces(file, "text"));
+}
+
+TEST(Confutils, RefusesTheLinkOfSomebodyElse) {
+  if (geteuid() != 0) {
+    return;  // there is nobody to give it to
+  }
+  const TempDir dir;
+  dir.write("target", "old");
+  const std::string link = dir.path("link");
+  ASSERT_EQ(symlink("target", link.c_str()), 0);
+  ASSERT_EQ(lchown(link.c_str(), kSomeone, kSomeGroup), 0);
+  Error error;
+  EXPECT_FALSE(set_contents(link, "new", error));
+  EXPECT_TRUE(error.matches(G_FILE_ERROR, G_FILE_ERROR_PERM)) << error.message();
+  EXPECT_EQ(dir.read("target"), "old");
+}
+
+TEST(Confutils, FollowsALinkToAFileThatIsStillToBeMade) {
+  const TempDir dir;
+  const std::string link = dir.path("link");
+  ASSERT_EQ(symlink("target", link.c_str()), 0);
+  Error error;
+  EXPECT_TRUE(set_contents(link, "new", error));
+  EXPECT_EQ(dir.read("target"), "new");
+  EXPECT_FALSE(replaces(link, "new"));
+}
+
+TEST(Confutils, GivesUpOnLinksThatGoRound) {
+  const TempDir dir;
+  const std::string link = dir.path("link");
+  ASSERT_EQ(symlink("link", link.c_str()), 0);
+  Error error;
+  EXPECT_FALSE(set_contents(link, "new", error));
+  EXPECT_TRUE(error.matches(G_FILE_ERROR, G_FILE_ERROR_LOOP)) << error.message();
 }
 
 TEST(Confutils, LeavesTheOldFileAndNothingElseWhenTheDiskIsFull) {

@@ -2,12 +2,14 @@
 #include "platform/kv-log.h"
 
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <array>
 #include <csignal>
 #include <cstdlib>
+#include <string>
 
 #include "base/log.h"
 #include "base/unique-fd.h"
@@ -63,6 +65,31 @@ TEST(KvLog, PrintsMessagesOfOtherDomainsAndOfNone) {
     g_log(nullptr, G_LOG_LEVEL_WARNING, "nobody's");
   });
   EXPECT_EQ(output.text, "WARNING: GLib-GIO: theirs\nWARNING: nobody's\n");
+}
+
+// The writer's own pipe stands for the stream that the journal has opened.
+void name_own_output_as_journal() {
+  struct stat file {};
+  EXPECT_EQ(fstat(STDOUT_FILENO, &file), 0);
+  const auto stream = std::to_string(file.st_dev) + ":" + std::to_string(file.st_ino);
+  g_setenv("JOURNAL_STREAM", stream.c_str(), TRUE);
+}
+
+TEST(KvLog, TellsTheJournalTheLevel) {
+  const auto output = output_of([] {
+    name_own_output_as_journal();
+    log_critical("one");
+    log_info("two");
+  });
+  EXPECT_EQ(output.text, "<3>CRITICAL: portd: one\n<6>INFO: portd: two\n");
+}
+
+TEST(KvLog, TellsNobodyElseWhatTheJournalOfItsCallerIs) {
+  const auto output = output_of([] {
+    g_setenv("JOURNAL_STREAM", "8:12345678", TRUE);
+    log_critical("one");
+  });
+  EXPECT_EQ(output.text, "CRITICAL: portd: one\n");
 }
 
 TEST(KvLog, KeepsAMessageOnOneLineWhateverItHolds) {

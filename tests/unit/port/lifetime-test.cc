@@ -5,7 +5,7 @@
 
 namespace {
 
-constexpr int kUnknownKind = 42;
+constexpr auto kUnknownKind = static_cast<BackendKind>(42);
 
 class PortLifetime : public PortFixture {};
 class PortBackend : public PortFixture {};
@@ -37,7 +37,7 @@ TEST_F(PortLifetime, EndsQuietlyForAPortWithoutABackend) {
 
 TEST_F(PortBackend, IsChosenByItsKind) {
   const IOPortRef port(io_port_new());
-  for (const int kind : {kVirtualKind, kSysfsKind, kNullKind, kCheckKind}) {
+  for (const BackendKind kind : {BACKEND_VIRTUAL, BACKEND_SYSFS, BACKEND_NULL, BACKEND_CHECK}) {
     io_port_set_backend(port.get(), kind);
     EXPECT_EQ(io_port_get_backend(port.get()), kind);
     EXPECT_TRUE(io_port_has_backend(port.get())) << kind;
@@ -45,26 +45,41 @@ TEST_F(PortBackend, IsChosenByItsKind) {
 }
 
 TEST_F(PortBackend, OfAnUnknownKindIsNone) {
-  for (const int kind : {10, kUnknownKind, -1, INT32_MAX, INT32_MIN}) {
+  for (const int number : {10, 42, -1, INT32_MAX, INT32_MIN}) {
     const IOPortRef port(io_port_new());
+    const auto kind = static_cast<BackendKind>(number);
     io_port_set_backend(port.get(), kind);
     EXPECT_FALSE(io_port_has_backend(port.get())) << kind;
     EXPECT_EQ(io_port_get_backend(port.get()), kind);
   }
 }
 
-TEST_F(PortBackend, OfAnUnknownKindCanNotBeRegistered) {
-  io_port_register_backend(10, nullptr);
-  io_port_register_backend(-1, nullptr);
-  const auto port = PortBuilder().set_up();
-  EXPECT_TRUE(io_port_has_backend(port.get()));
+TEST_F(PortBackend, ThatServesNothingReadsInactiveAndEnduresEveryRequest) {
+  static constexpr PortFunctions nothing{};
+  io_port_register_backend({"nothing", BACKEND_NULL, &nothing});
+  const auto port = PortBuilder()
+                        .backend(BACKEND_NULL)
+                        .configurable_output()
+                        .property("device", "path", "/dev/null")
+                        .set_up();
+  EXPECT_TRUE(io_port_is_set_up(port.get()));
+  EXPECT_EQ(io_port_backend_data(port.get()), nullptr);
+  EXPECT_TRUE(io_port_set_state(port.get(), true));
+  EXPECT_FALSE(io_port_get_state(port.get()));
+  EXPECT_TRUE(io_port_set_direction(port.get(), true));
+  io_port_set_watch(port.get());
+  EXPECT_TRUE(io_port_set_activelow(port.get(), true, false));
+  EXPECT_FALSE(io_port_set_supervised(port.get(), true));
+  io_port_drop(port.get());
+  EXPECT_TRUE(io_port_setup(port.get()));
+  backends_register();
 }
 
 TEST_F(PortBackend, ThatIsChosenSecondReplacesTheRecordOfTheFirst) {
   const IOPortRef port(io_port_new());
-  io_port_set_backend(port.get(), kCheckKind);
+  io_port_set_backend(port.get(), BACKEND_CHECK);
   io_port_set_backend_property(port.get(), "device", "setup", "fail");
-  io_port_set_backend(port.get(), kVirtualKind);
+  io_port_set_backend(port.get(), BACKEND_VIRTUAL);
   ASSERT_NE(io_port_backend_data(port.get()), nullptr);
   EXPECT_EQ(dynamic_cast<CheckBackendData *>(io_port_backend_data(port.get())), nullptr);
   EXPECT_TRUE(io_port_setup(port.get()));
@@ -72,9 +87,9 @@ TEST_F(PortBackend, ThatIsChosenSecondReplacesTheRecordOfTheFirst) {
 
 TEST_F(PortBackend, ThatIsChosenSecondDoesNotGetThePropertiesOfTheFirst) {
   const IOPortRef port(io_port_new());
-  io_port_set_backend(port.get(), kSysfsKind);
+  io_port_set_backend(port.get(), BACKEND_SYSFS);
   io_port_set_backend_property(port.get(), "device", "setup", "fail");
-  io_port_set_backend(port.get(), kCheckKind);
+  io_port_set_backend(port.get(), BACKEND_CHECK);
   EXPECT_TRUE(check_record(port).properties.empty());
   ASSERT_TRUE(io_port_setup(port.get()));
   io_port_drop(port.get());
@@ -84,7 +99,7 @@ TEST_F(PortBackend, ThatIsChosenSecondDoesNotGetThePropertiesOfTheFirst) {
 
 TEST_F(PortBackend, ThatIsReplacedByNoneLeavesNoRecord) {
   const IOPortRef port(io_port_new());
-  io_port_set_backend(port.get(), kCheckKind);
+  io_port_set_backend(port.get(), BACKEND_CHECK);
   io_port_set_backend(port.get(), kUnknownKind);
   EXPECT_FALSE(io_port_has_backend(port.get()));
   EXPECT_EQ(io_port_backend_data(port.get()), nullptr);
@@ -92,9 +107,9 @@ TEST_F(PortBackend, ThatIsReplacedByNoneLeavesNoRecord) {
 
 TEST_F(PortBackend, ThatIsChosenAgainKeepsItsRecord) {
   const IOPortRef port(io_port_new());
-  io_port_set_backend(port.get(), kCheckKind);
+  io_port_set_backend(port.get(), BACKEND_CHECK);
   io_port_set_backend_property(port.get(), "section", "key", "value");
-  io_port_set_backend(port.get(), kCheckKind);
+  io_port_set_backend(port.get(), BACKEND_CHECK);
   EXPECT_EQ(check_record(port).properties.size(), 1U);
 }
 
@@ -142,6 +157,16 @@ TEST_F(DroppedPort, ReadsInactiveAndRefusesToBeDriven) {
   EXPECT_FALSE(io_port_is_busy(port.get()));
 }
 
+TEST_F(DroppedPort, HasNoEventsDeclared) {
+  IoEvent siren;
+  siren.name = "siren";
+  const auto port = PortBuilder().output().event(siren).set_up();
+  io_port_declare_events(port.get());
+  listener.heard();
+  io_port_drop(port.get());
+  EXPECT_EQ(listener.heard(), Lines{"undeclare siren"});
+}
+
 TEST_F(DroppedPort, TakesSettingsWithoutTouchingItsBackend) {
   const auto port = PortBuilder().configurable_output().set_up();
   io_port_drop(port.get());
@@ -182,7 +207,7 @@ TEST_F(DroppedPort, OfASysfsFileComesBackReadingTheFile) {
   const TempDir dir;
   const std::string file = dir.write("flag", "1\n");
   const auto port = PortBuilder()
-                        .backend(kSysfsKind)
+                        .backend(BACKEND_SYSFS)
                         .property("device", "path", file.c_str())
                         .property("device", "timeout", "1000")
                         .set_up();
@@ -195,7 +220,7 @@ TEST_F(DroppedPort, OfASysfsFileComesBackReadingTheFile) {
 }
 
 TEST_F(DroppedPort, ThatIsVirtualComesBackInactive) {
-  const auto port = PortBuilder().backend(kVirtualKind).output().set_up();
+  const auto port = PortBuilder().backend(BACKEND_VIRTUAL).output().set_up();
   io_port_set_virtual(port.get(), true);
   io_port_drop(port.get());
   EXPECT_FALSE(io_port_get_state(port.get()));
@@ -206,7 +231,7 @@ TEST_F(DroppedPort, ThatIsVirtualComesBackInactive) {
 }
 
 TEST_F(DroppedPort, ThatIsVirtualStoresNothing) {
-  const auto port = PortBuilder().backend(kVirtualKind).output().set_up();
+  const auto port = PortBuilder().backend(BACKEND_VIRTUAL).output().set_up();
   io_port_drop(port.get());
   EXPECT_TRUE(io_port_set_virtual(port.get(), true));
   ASSERT_TRUE(io_port_setup(port.get()));
@@ -215,7 +240,7 @@ TEST_F(DroppedPort, ThatIsVirtualStoresNothing) {
 
 TEST_F(DroppedPort, IsNotWatched) {
   const auto port =
-      PortBuilder().backend(kSysfsKind).property("device", "path", "/dev/null").set_up();
+      PortBuilder().backend(BACKEND_SYSFS).property("device", "path", "/dev/null").set_up();
   io_port_drop(port.get());
   io_port_set_watch(port.get());
   EXPECT_EQ(g_main_context_find_source_by_user_data(nullptr, port.get()), nullptr);
@@ -243,7 +268,7 @@ TEST_F(DroppedPort, TellsItsBackendWhatComesToIt) {
 TEST_F(DroppedPort, CanBeGivenAnotherBackend) {
   const auto port = PortBuilder().set_up();
   io_port_drop(port.get());
-  io_port_set_backend(port.get(), kVirtualKind);
+  io_port_set_backend(port.get(), BACKEND_VIRTUAL);
   EXPECT_TRUE(io_port_setup(port.get()));
 }
 

@@ -25,6 +25,12 @@ class Registry : public PortFixture {
     }
     return ids;
   }
+  // How many parked ports came back, where none of them has to wait for a service.
+  static std::optional<std::size_t> retry_parked() {
+    std::optional<std::size_t> back;
+    port_registry_retry_parked([&](std::size_t count) { back = count; });
+    return back;
+  }
   static std::optional<std::string> input_name(std::uint32_t number) { return names(number).first; }
   static std::optional<std::string> output_name(std::uint32_t number) {
     return names(number).second;

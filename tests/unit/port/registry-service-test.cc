@@ -109,13 +109,13 @@ TEST_F(RegistryService, BringsAParkedPortBackOnceItWorks) {
   add(port("fine", 1));
   add(failing("broken", 0).optional());
   port_registry_setup_all();
-  EXPECT_EQ(port_registry_retry_parked(), 0U);
+  EXPECT_EQ(retry_parked(), 0U);
   repair(port_registry_find_parked(0));
-  EXPECT_EQ(port_registry_retry_parked(), 1U);
+  EXPECT_EQ(retry_parked(), 1U);
   EXPECT_EQ(ids_in_order(), (Lines{"broken", "fine"}));
   EXPECT_TRUE(io_port_is_set_up(port_registry_find(0).get()));
   EXPECT_EQ(port_registry_find_parked(0), nullptr);
-  EXPECT_EQ(port_registry_retry_parked(), 0U);
+  EXPECT_EQ(retry_parked(), 0U);
 }
 
 TEST_F(RegistryService, BringsBackOnlyTheParkedPortsThatWork) {
@@ -126,7 +126,7 @@ TEST_F(RegistryService, BringsBackOnlyTheParkedPortsThatWork) {
   EXPECT_EQ(port_registry_count(), 0U);
   repair(port_registry_find_parked(0));
   repair(port_registry_find_parked(2));
-  EXPECT_EQ(port_registry_retry_parked(), 2U);
+  EXPECT_EQ(retry_parked(), 2U);
   EXPECT_EQ(id_of(port_registry_find_parked(1)), "b");
   EXPECT_EQ(port_registry_count(), 2U);
 }
@@ -145,7 +145,7 @@ TEST_F(RegistryService, FindsThePortThatWasParkedFirstOfTwoWithOneNumber) {
     port_registry_park(first);
     port_registry_park(second);
     EXPECT_EQ(port_registry_find_parked(3).get(), first);
-    EXPECT_EQ(port_registry_retry_parked(), 2U);
+    EXPECT_EQ(retry_parked(), 2U);
   }
 }
 
@@ -166,7 +166,7 @@ TEST_F(RegistryService, PutsParkedPortsInFrontOfOnesThatWereParkedBefore) {
   for (const char *id : {"b", "a", "c"}) {
     port_registry_park(port_registry_get_by_id(id).get());
   }
-  EXPECT_EQ(port_registry_retry_parked(), 3U);
+  EXPECT_EQ(retry_parked(), 3U);
   EXPECT_EQ(ids_in_order(), (Lines{"b", "a", "c"}));
 }
 
@@ -178,7 +178,7 @@ TEST_F(RegistryService, ParksAPortOnRequestWhenItIsOptional) {
   port_registry_park(needed.get());
   EXPECT_EQ(ids_in_order(), Lines{"n"});
   EXPECT_EQ(id_of(port_registry_find_parked(0)), "o");
-  EXPECT_EQ(port_registry_retry_parked(), 1U);
+  EXPECT_EQ(retry_parked(), 1U);
   EXPECT_EQ(ids_in_order(), (Lines{"o", "n"}));
   EXPECT_TRUE(io_port_is_set_up(optional.get()));
 }
@@ -193,7 +193,7 @@ TEST_F(RegistryService, DoesNotParkAPortTwice) {
   const auto optional = port("o", 0).optional().set_up_and_registered();
   port_registry_park(optional.get());
   port_registry_park(optional.get());
-  EXPECT_EQ(port_registry_retry_parked(), 1U);
+  EXPECT_EQ(retry_parked(), 1U);
   EXPECT_EQ(port_registry_count(), 1U);
 }
 

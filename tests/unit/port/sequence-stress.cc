@@ -8,7 +8,7 @@
 #include <thread>
 #include <vector>
 
-#include "backends/backends.h"
+#include "daemon/backends.h"
 #include "port/port-listener.h"
 #include "port/port-registry.h"
 #include "support/log-capture.h"

@@ -1,9 +1,12 @@
 // Action sequences: which ports run them, what happens at each step, and how they end.
+#include <poll.h>
+
 #include <algorithm>
 #include <atomic>
 #include <limits>
 #include <thread>
 
+#include "port/port-listener.h"
 #include "support/deadline.h"
 #include "support/port-fixture.h"
 
@@ -42,6 +45,52 @@ class Sequence : public PortFixture {
     return port;
   }
 };
+
+// --- Those who are told ---
+
+std::atomic<int> waits = 0;
+
+TEST_F(Sequence, WithoutPausesWaitsNowAndThenUntilItsReportsAreTaken) {
+  waits = 0;
+  port_listener().wait_until_sent = [](GCancellable * /*cancelled*/, std::int64_t deadline) {
+    EXPECT_GT(deadline, g_get_monotonic_time());
+    ++waits;
+  };
+  const auto port = PortBuilder().output().set_up();
+  ASSERT_TRUE(drive(port, std::vector<ActionStep>(1000, {true, 0})));
+  ASSERT_TRUE(ended());
+  EXPECT_EQ(waits, 1000 / 64);
+}
+
+TEST_F(Sequence, HoldsNoLockWhileItWaitsUntilItsReportsAreTaken) {
+  static IOPort *driven = nullptr;
+  port_listener().wait_until_sent = [](GCancellable * /*cancelled*/, std::int64_t /*deadline*/) {
+    std::thread([] { EXPECT_TRUE(io_port_set_state(driven, false)); }).join();
+  };
+  const auto port = PortBuilder().output().set_up();
+  driven = port.get();
+  ASSERT_TRUE(drive(port, std::vector<ActionStep>(64, {true, 0})));
+  ASSERT_TRUE(ended());
+  EXPECT_EQ(check_record(port).state, 0);
+}
+
+TEST_F(Sequence, IsCancelledWhileNobodyTakesItsReports) {
+  waits = 0;
+  port_listener().wait_until_sent = [](GCancellable *cancelled, std::int64_t /*deadline*/) {
+    ++waits;
+    pollfd cancel = {.fd = g_cancellable_get_fd(cancelled), .events = POLLIN, .revents = 0};
+    EXPECT_EQ(poll(&cancel, 1, kLongerThanPatienceMs), 1);
+    g_cancellable_release_fd(cancelled);
+  };
+  const auto port = PortBuilder().output().set_up();
+  ASSERT_TRUE(drive(port, std::vector<ActionStep>(1000, {true, 0})));
+  while (waits == 0) {
+    g_thread_yield();
+  }
+  EXPECT_TRUE(io_port_set_activelow(port.get(), true, false));
+  ASSERT_TRUE(ended());
+  EXPECT_EQ(waits, 1);
+}
 
 // --- Running ---
 
@@ -156,7 +205,7 @@ TEST_F(Sequence, ReportsVirtualStepsOfInputsToo) {
 }
 
 TEST_F(Sequence, StoresVirtualStepsOnVirtualOutputs) {
-  const auto port = PortBuilder().backend(kVirtualKind).output().set_up();
+  const auto port = PortBuilder().backend(BACKEND_VIRTUAL).output().set_up();
   ASSERT_TRUE(report(port, {{false, 0}, {true, 0}}));
   ASSERT_TRUE(ended());
   EXPECT_TRUE(io_port_get_state(port.get()));
@@ -175,7 +224,7 @@ TEST_F(Sequence, IsRefusedOnAnInput) {
 }
 
 TEST_F(Sequence, IsRefusedOnAVirtualPort) {
-  const auto port = PortBuilder().backend(kVirtualKind).output().set_up();
+  const auto port = PortBuilder().backend(BACKEND_VIRTUAL).output().set_up();
   EXPECT_FALSE(drive(port, {{true, 0}}));
   EXPECT_TRUE(log.took_warning(kRefused));
 }

@@ -1,4 +1,5 @@
 // What a port is called and flagged, and the settings that users change while it runs.
+#include "port/port-name.h"
 #include "support/port-fixture.h"
 
 namespace {
@@ -195,6 +196,28 @@ TEST_F(PortNames, OfTheOtherRoleLeaveTheEventsAlone) {
   EXPECT_EQ(listener.heard(), Lines{"redeclare alarm"});
 }
 
+TEST_F(PortNames, AreUtf8OfAtMost4096Bytes) {
+  const auto port = PortBuilder().input().names("Door", "").build();
+  std::string euros;
+  while (euros.size() + 3 <= kPortNameMaxBytes) {
+    euros += "\u20ac";
+  }
+  EXPECT_FALSE(io_port_set_input_name(port.get(), euros + "xx"));
+  EXPECT_FALSE(io_port_set_input_name(port.get(), "Caf\xe9"));
+  EXPECT_FALSE(io_port_set_input_name(port.get(), std::string("a\0b", 3)));
+  EXPECT_EQ(io_port_get_name(port.get()), "Door");
+  EXPECT_TRUE(io_port_set_input_name(port.get(), euros + "x"));
+}
+
+TEST_F(PortNames, ThatCanNotBeOnesAreLeftOutOfWhatIsRestored) {
+  const auto port = PortBuilder().id("gate").input().names("Door", "").build();
+  io_port_restore_name(port.get(), std::string(kPortNameMaxBytes + 1, 'x'), true);
+  EXPECT_TRUE(log.took_containing(G_LOG_LEVEL_WARNING, "Port gate: the input name is left out"));
+  io_port_restore_name(port.get(), "Caf\xe9", true);
+  EXPECT_TRUE(log.took_containing(G_LOG_LEVEL_WARNING, "Port gate: the input name is left out"));
+  EXPECT_EQ(io_port_get_name(port.get()), "Door");
+}
+
 TEST_F(PortNames, MayBeEmptyWhichIsNotUnset) {
   const auto port = PortBuilder().output().event(event_for_outputs("siren")).build();
   EXPECT_TRUE(io_port_set_output_name(port.get(), ""));
@@ -348,11 +371,11 @@ TEST_F(PortDirection, ExchangesTheEventsOfTheRolesAndReportsTheState) {
                         .set_up();
   check_record(port).state = 1;
   EXPECT_TRUE(io_port_set_direction(port.get(), true));
-  EXPECT_EQ(listener.heard(),
-            (Lines{"declare alarm", "undeclare siren", "send alarm 1", "changed 1 on"}));
+  EXPECT_EQ(listener.heard(), (Lines{"redeclare alarm", "declare alarm", "undeclare siren",
+                                     "send alarm 1", "changed 1 on"}));
   EXPECT_TRUE(io_port_set_direction(port.get(), false));
-  EXPECT_EQ(listener.heard(),
-            (Lines{"undeclare alarm", "declare siren", "send siren 1", "changed 1 on"}));
+  EXPECT_EQ(listener.heard(), (Lines{"undeclare alarm", "redeclare siren", "declare siren",
+                                     "send siren 1", "changed 1 on"}));
 }
 
 TEST_F(PortDirection, IsReportedAlsoWhenItIsGivenAgain) {

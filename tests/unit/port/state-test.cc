@@ -86,7 +86,7 @@ TEST_F(PortState, TellsNothingWhenAnOutputKeepsItsState) {
 }
 
 TEST_F(PortState, TellsNothingWhenTheLineDoesNotFollow) {
-  const auto port = PortBuilder().backend(kNullKind).output().set_up();
+  const auto port = PortBuilder().backend(BACKEND_NULL).output().set_up();
   EXPECT_TRUE(io_port_set_state(port.get(), true));
   EXPECT_FALSE(io_port_get_state(port.get()));
   EXPECT_EQ(listener.heard(), Lines{});
@@ -123,7 +123,7 @@ TEST_F(PortState, RefusesToDriveAConfigurablePortWhileItIsAnInput) {
 }
 
 TEST_F(PortState, RefusesToDriveAVirtualOutput) {
-  const auto port = PortBuilder().backend(kVirtualKind).output().set_up();
+  const auto port = PortBuilder().backend(BACKEND_VIRTUAL).output().set_up();
   EXPECT_FALSE(io_port_set_state(port.get(), true));
   EXPECT_TRUE(log.took_warning(kRefused));
   EXPECT_FALSE(io_port_get_state(port.get()));
@@ -172,7 +172,7 @@ TEST_F(PortState, DrivingNoPortAtAllIsOnlyLogged) {
 // --- Reporting without hardware ---
 
 TEST_F(PortState, OfAVirtualOutputIsWhatClientsReport) {
-  const auto port = PortBuilder().backend(kVirtualKind).output().number(7).set_up();
+  const auto port = PortBuilder().backend(BACKEND_VIRTUAL).output().number(7).set_up();
   EXPECT_TRUE(io_port_set_virtual(port.get(), true));
   EXPECT_TRUE(io_port_get_state(port.get()));
   EXPECT_EQ(listener.heard(), Lines{"changed 7 on"});
@@ -180,20 +180,20 @@ TEST_F(PortState, OfAVirtualOutputIsWhatClientsReport) {
 }
 
 TEST_F(PortState, OfAVirtualOutputIsStoredWithoutInversion) {
-  const auto port = PortBuilder().backend(kVirtualKind).output().activelow().set_up();
+  const auto port = PortBuilder().backend(BACKEND_VIRTUAL).output().activelow().set_up();
   EXPECT_TRUE(io_port_set_virtual(port.get(), true));
   EXPECT_FALSE(io_port_get_state(port.get()));
 }
 
 TEST_F(PortState, OfAVirtualInputIsReportedButNotStored) {
-  const auto port = PortBuilder().backend(kVirtualKind).input().set_up();
+  const auto port = PortBuilder().backend(BACKEND_VIRTUAL).input().set_up();
   EXPECT_TRUE(io_port_set_virtual(port.get(), true));
   EXPECT_FALSE(io_port_get_state(port.get()));
   EXPECT_EQ(listener.heard(), Lines{"changed 1 on"});
 }
 
 TEST_F(PortState, OfAVirtualConfigurablePortIsReportedButNotStored) {
-  const auto port = PortBuilder().backend(kVirtualKind).configurable_output().set_up();
+  const auto port = PortBuilder().backend(BACKEND_VIRTUAL).configurable_output().set_up();
   EXPECT_TRUE(io_port_set_virtual(port.get(), true));
   EXPECT_FALSE(io_port_get_state(port.get()));
 }
@@ -206,14 +206,14 @@ TEST_F(PortState, ReportedByClientsLeavesTheLineAlone) {
 }
 
 TEST_F(PortState, IsReportedEachTimeThatAClientSaysSo) {
-  const auto port = PortBuilder().backend(kVirtualKind).output().set_up();
+  const auto port = PortBuilder().backend(BACKEND_VIRTUAL).output().set_up();
   EXPECT_TRUE(io_port_set_virtual(port.get(), true));
   EXPECT_TRUE(io_port_set_virtual(port.get(), true));
   EXPECT_EQ(listener.heard(), (Lines{"changed 1 on", "changed 1 on"}));
 }
 
 TEST_F(PortState, IsNeitherStoredNorReportedByClientsWhileEventsAreOff) {
-  const auto port = PortBuilder().backend(kVirtualKind).output().set_up();
+  const auto port = PortBuilder().backend(BACKEND_VIRTUAL).output().set_up();
   io_port_set_events_enabled(port.get(), false);
   EXPECT_TRUE(io_port_set_virtual(port.get(), true));
   EXPECT_FALSE(io_port_get_state(port.get()));

@@ -79,6 +79,48 @@ TEST_F(SettingsOwner, StaysWhenTheGroupDoesNotExist) {
   EXPECT_EQ(status.st_uid, geteuid());
 }
 
+TEST_F(SettingsOwner, StaysThatOfAFileWithASecondName) {
+  account = &known_user;
+  account_group = &known_group;
+  dir.write("secret", "");
+  ASSERT_EQ(link(dir.path("secret").c_str(), file.c_str()), 0);
+  param_chown_to_service_user(file);
+  EXPECT_TRUE(log.took_containing(G_LOG_LEVEL_WARNING, "chown failed on file '" + file + "': "));
+  struct stat status {};
+  ASSERT_EQ(stat(file.c_str(), &status), 0);
+  EXPECT_EQ(status.st_uid, geteuid());
+}
+
+TEST_F(SettingsOwner, StaysThatOfAFileThatSomebodyElseLinksTo) {
+  if (!root) {
+    return;  // nobody else can make the link
+  }
+  account = &known_user;
+  account_group = &known_group;
+  dir.write("secret", "");
+  ASSERT_EQ(symlink("secret", file.c_str()), 0);
+  ASSERT_EQ(lchown(file.c_str(), kServiceUid, kServiceGid), 0);
+  param_chown_to_service_user(file);
+  EXPECT_TRUE(log.took_warning("chown failed on file '" + file + "': (1) Operation not permitted"));
+  struct stat status {};
+  ASSERT_EQ(stat(file.c_str(), &status), 0);
+  EXPECT_EQ(status.st_uid, 0U);
+}
+
+TEST_F(SettingsOwner, OfAFileThatIsTheAccountsAlreadyIsNotChanged) {
+  account = &known_user;
+  account_group = &known_group;
+  dir.write("portd.conf", "");
+  param_chown_to_service_user(file);
+  struct stat before {};
+  ASSERT_EQ(stat(file.c_str(), &before), 0);
+  param_chown_to_service_user(file);
+  struct stat after {};
+  ASSERT_EQ(stat(file.c_str(), &after), 0);
+  EXPECT_EQ(after.st_ctim.tv_sec, before.st_ctim.tv_sec);
+  EXPECT_EQ(after.st_ctim.tv_nsec, before.st_ctim.tv_nsec);
+}
+
 TEST_F(SettingsOwner, CanNotBeChangedOfAFileThatIsMissing) {
   account = &known_user;
   account_group = &known_group;

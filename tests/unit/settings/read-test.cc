@@ -180,6 +180,28 @@ TEST_F(ReadSettings, StopAtAValueOfTheWrongType) {
   }
 }
 
+TEST_F(ReadSettings, StopAtANameThatCanNotBeInterpreted) {
+  const auto port = PortBuilder().input().number(3).names("Door", "").build();
+  EXPECT_FALSE(apply(port, "[port]\ninput_name=C:\\quarry\ninput_activelow=true\n"));
+  EXPECT_EQ(io_port_get_name(port.get()), std::nullopt);
+  EXPECT_FALSE(io_port_get_activelow(port.get(), true));
+  EXPECT_TRUE(errors.starts_with("Error parsing param file: ")) << errors;
+  EXPECT_TRUE(errors.ends_with("\nIn file " + file + ", group port (port 3), key input_name\n"))
+      << errors;
+}
+
+TEST_F(ReadSettings, StopAtWordsThatCanNotBeInterpreted) {
+  const std::pair<const char *, const char *> wrong[] = {
+      {"button_type=pulse", "button_type=pulse\\"}, {"monostable", "bistable\\q"}};
+  for (const auto &[line, replacement] : wrong) {
+    const auto port = PortBuilder().output().build();
+    EXPECT_FALSE(apply(port, with(kOutputGroup, line, replacement))) << replacement;
+    EXPECT_EQ(io_port_get_mode(port.get()), PORT_MODE_BISTABLE);
+    EXPECT_EQ(io_port_get_delay_time(port.get()), 0);
+    EXPECT_TRUE(errors.starts_with("Error parsing param file: ")) << errors;
+  }
+}
+
 // --- Words and numbers ---
 
 TEST_F(ReadSettings, KnowTheThreeButtons) {
@@ -280,7 +302,8 @@ TEST_F(ReadSupervision, StopsAtRangesThatAreNone) {
 TEST_F(ReadSupervision, StopsAtRangesThatAreRefused) {
   fake_record(port).refuses_ranges = true;
   EXPECT_FALSE(apply(port, group("supervised_input_ranges=@a(suu) []\nsupervised_input=true\n")));
-  EXPECT_EQ(errors, "Error parsing param file: The fake refuses.\n");
+  EXPECT_EQ(errors, "Error parsing param file: The fake refuses.\nIn file " + file +
+                        ", group port (port 1), key supervised_input_ranges\n");
   EXPECT_FALSE(io_port_is_supervised(port.get()));
 }
 

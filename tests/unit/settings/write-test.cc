@@ -114,6 +114,18 @@ TEST_F(WriteSettings, AreReadBackAsTheyWere) {
   EXPECT_EQ(io_port_get_delay_time(read.get()), -5);
 }
 
+TEST_F(WriteSettings, KeepTheWhiteSpaceThatANameBeginsWith) {
+  for (const char *name : {"\f", "\fx", "\f x", " \fx", "\\fx", "\f\\fx", "\f\n", "\tx", "\v"}) {
+    const auto written = PortBuilder().input().names(name, "").build();
+    (void)saved(written);
+    const auto read = PortBuilder().input().build();
+    ASSERT_TRUE(param_read_configuration(file));
+    EXPECT_TRUE(param_get_conf_vals(read.get()));
+    EXPECT_EQ(io_port_get_name(read.get()), name) << contents();
+    param_free_configuration();
+  }
+}
+
 // --- What is left in the file ---
 
 TEST_F(WriteSettings, CreateAMissingFileWithThatPortOnly) {
@@ -196,6 +208,15 @@ TEST_F(WriteSettings, AreSkippedWhenTheFileCanNotBeRead) {
   dir.write("portd.conf", "no key file");
   EXPECT_EQ(saved(PortBuilder().build()), "no key file");
   EXPECT_TRUE(errors.starts_with("Could not read key file: ")) << errors;
+  EXPECT_TRUE(
+      log.took_critical("param_save_for_port: assertion 'param_read_configuration (file)' failed"));
+}
+
+TEST_F(WriteSettings, AreSkippedWhenTheFileIsNoRegularOne) {
+  ASSERT_EQ(mkfifo(file.c_str(), 0600), 0);
+  OutputCapture standard_error(STDERR_FILENO);
+  param_save_for_port(PortBuilder().build().get(), file);
+  EXPECT_EQ(standard_error.text(), "Could not read key file: " + file + ": Not a regular file\n");
   EXPECT_TRUE(
       log.took_critical("param_save_for_port: assertion 'param_read_configuration (file)' failed"));
 }

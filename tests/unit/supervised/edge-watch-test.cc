@@ -18,7 +18,7 @@ class EdgeWatch : public Bench {
       make_line(pin);
     }
     write("spidev", "");
-    port = make_port(kSpiKind, PORT_INPUT,
+    port = make_port(BACKEND_SPI, PORT_INPUT,
                      {{"input", "pin", "1"},
                       {"io_ctrl", "pin", "2"},
                       {"sio_ctrl", "pin", "3"},

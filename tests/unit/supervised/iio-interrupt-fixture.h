@@ -4,11 +4,11 @@
 #include <linux/iio/events.h>
 #include <unistd.h>
 
+#include <filesystem>
 #include <string>
 #include <vector>
 
 #include "base/unique-fd.h"
-#include "supervised/supervised-backends.h"
 #include "support/fake-ioctl.h"
 #include "support/iio-bench.h"
 
@@ -44,7 +44,7 @@ class Interrupt : public IioBench {
                                                           {"range", "upper", "300"}}) {
       all.push_back(property);
     }
-    return make_port(kIioInterruptKind, type, all);
+    return make_port(BACKEND_IIO_INTERRUPT, type, all);
   }
 
   static IOPortRef watched(const std::vector<Property> &more = {}) {

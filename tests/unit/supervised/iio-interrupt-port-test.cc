@@ -3,6 +3,7 @@
 #include <thread>
 
 #include "iio-interrupt-fixture.h"
+#include "port/ioport-private.h"
 
 namespace {
 
@@ -53,7 +54,7 @@ TEST_F(Interrupt, AnAdcPortIsAlwaysWatchedByRangesOfItsOwn) {
 }
 
 TEST_F(Interrupt, TheModeCountsForTheRangesAfterIt) {
-  const IOPortRef port = make_port(kIioInterruptKind, PORT_INPUT,
+  const IOPortRef port = make_port(BACKEND_IIO_INTERRUPT, PORT_INPUT,
                                    {{"range", "state", "closed"},
                                     {"range", "lower", "1"},
                                     {"range", "upper", "2"},
@@ -110,7 +111,7 @@ TEST_F(Interrupt, ADeviceWithoutEventsFailsTheSetUp) {
 }
 
 TEST_F(Interrupt, APortWithNothingButAPinIsRefusedAndHarmless) {
-  const IOPortRef port = make_port(kIioInterruptKind, PORT_INPUT, {{"input", "pin", "1"}});
+  const IOPortRef port = make_port(BACKEND_IIO_INTERRUPT, PORT_INPUT, {{"input", "pin", "1"}});
   EXPECT_FALSE(io_port_setup(port.get()));
   EXPECT_EQ(readout(port), "undefined 0");
   EXPECT_TRUE(io_port_set_supervised(port.get(), true));
@@ -153,7 +154,7 @@ TEST_F(Interrupt, ActionThreadsMayReadWhileTheDeviceIsFoundAnew) {
 
 TEST_F(Interrupt, AnOutputNeedsNoConverter) {
   for (const char *mode : {"adc", "supervised"}) {
-    const IOPortRef port = make_port(kIioInterruptKind, PORT_OUTPUT,
+    const IOPortRef port = make_port(BACKEND_IIO_INTERRUPT, PORT_OUTPUT,
                                      {{"output", "pin", "4"}, {"device", "mode", mode}});
     EXPECT_TRUE(io_port_setup(port.get()));
     EXPECT_TRUE(io_port_set_state(port.get(), true));
@@ -165,7 +166,7 @@ TEST_F(Interrupt, AnOutputNeedsNoConverter) {
 
 TEST_F(Interrupt, ThePinThatLeadsToTheConverterIsOptional) {
   const IOPortRef port = make_port(
-      kIioInterruptKind, PORT_INPUT,
+      BACKEND_IIO_INTERRUPT, PORT_INPUT,
       {{"input", "pin", "1"}, {"io_ctrl", "pin", "2"}, {"device", "driver", "comparator"}});
   EXPECT_TRUE(io_port_setup(port.get()));
   EXPECT_TRUE(line(2));
@@ -225,7 +226,7 @@ TEST_F(Interrupt, TheControlPinsOfAnOutputAreAProgrammingError) {
   EXPECT_DEATH(
       {
         io_port_set_type(port.get(), PORT_OUTPUT);
-        supervised_iio_interrupt_backend_functions(port.get())->set_direction(port.get(), true);
+        port->functions->set_direction(port.get(), true);
       },
       "supervised-iio-interrupt-backend.*iio_int_set_control_pins.*port->type == PORT_INPUT");
 }

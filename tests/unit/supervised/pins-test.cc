@@ -28,7 +28,7 @@ class Pins : public Bench {
     if (type != PORT_INPUT) {
       properties.push_back({"output", "pin", "4"});
     }
-    return make_port(kSpiKind, type, properties);
+    return make_port(BACKEND_SPI, type, properties);
   }
 
   // The two control pins as they are, io_ctrl first.
@@ -163,7 +163,7 @@ TEST_F(Pins, AnInputThatIsMadeOfAnOutputGetsThePlainPathWhateverTheOtherDoes) {
 }
 
 TEST_F(Pins, AConfigurablePortNeedsBothPlainPins) {
-  const IOPortRef port = make_port(kSpiKind, PORT_CONFIGURABLE, {{"input", "pin", "1"}});
+  const IOPortRef port = make_port(BACKEND_SPI, PORT_CONFIGURABLE, {{"input", "pin", "1"}});
   EXPECT_FALSE(io_port_setup(port.get()));
   EXPECT_TRUE(
       was_logged("critical: Supervised IO port should have both 'input' and 'output' pins."));
@@ -172,25 +172,26 @@ TEST_F(Pins, AConfigurablePortNeedsBothPlainPins) {
 TEST_F(Pins, AnInputNeedsExactlyOnePlainPin) {
   const char *message =
       "critical: Limited IO port should only have either 'input' or 'output' pin.";
-  IOPortRef port = make_port(kSpiKind, PORT_INPUT, {{"input", "pin", "1"}, {"output", "pin", "4"}});
+  IOPortRef port =
+      make_port(BACKEND_SPI, PORT_INPUT, {{"input", "pin", "1"}, {"output", "pin", "4"}});
   EXPECT_FALSE(io_port_setup(port.get()));
   EXPECT_TRUE(was_logged(message));
   logged();
-  port = make_port(kSpiKind, PORT_INPUT, {});
+  port = make_port(BACKEND_SPI, PORT_INPUT, {});
   EXPECT_FALSE(io_port_setup(port.get()));
   EXPECT_TRUE(was_logged(message));
 }
 
 TEST_F(Pins, AnInputWithoutTheMeasuredPathIsRefused) {
   const IOPortRef port =
-      make_port(kSpiKind, PORT_INPUT, {{"input", "pin", "1"}, {"io_ctrl", "pin", "2"}});
+      make_port(BACKEND_SPI, PORT_INPUT, {{"input", "pin", "1"}, {"io_ctrl", "pin", "2"}});
   EXPECT_FALSE(io_port_setup(port.get()));
   EXPECT_TRUE(was_logged("critical: Port line has no sio_ctrl pin"));
 }
 
 TEST_F(Pins, AnInputWithoutThePlainPathsSwitchWorks) {
   const IOPortRef port = make_port(
-      kSpiKind, PORT_INPUT,
+      BACKEND_SPI, PORT_INPUT,
       {{"input", "pin", "1"}, {"sio_ctrl", "pin", "3"}, {"device", "path", path("spidev")}});
   EXPECT_TRUE(io_port_setup(port.get()));
   EXPECT_TRUE(io_port_set_supervised(port.get(), true));
@@ -211,14 +212,14 @@ TEST_F(Pins, AnOutputIsJustThat) {
 }
 
 TEST_F(Pins, AnOutputWithoutAPinIsRefusedAndHarmless) {
-  const IOPortRef port = make_port(kSpiKind, PORT_OUTPUT, {});
+  const IOPortRef port = make_port(BACKEND_SPI, PORT_OUTPUT, {});
   EXPECT_FALSE(io_port_setup(port.get()));
   EXPECT_FALSE(io_port_set_state(port.get(), true));
   EXPECT_FALSE(io_port_get_state(port.get()));
 }
 
 TEST_F(Pins, AnInvertedPinIsActiveLow) {
-  const IOPortRef port = make_port(kSpiKind, PORT_INPUT,
+  const IOPortRef port = make_port(BACKEND_SPI, PORT_INPUT,
                                    {{"input", "pin", "1"},
                                     {"input", "inverted", "true"},
                                     {"io_ctrl", "pin", "2"},
@@ -236,9 +237,30 @@ TEST_F(Pins, APlainPinThatCannotBeHadDoesNotFailTheSetUp) {
   remove("class/gpio/gpio1");
   const IOPortRef port = make(PORT_INPUT);
   EXPECT_TRUE(io_port_setup(port.get()));
-  EXPECT_TRUE(was_logged("warning: Failed to allocate pin 1/(null)"));
+  EXPECT_TRUE(was_logged("critical: Failed to allocate pin 1/(null)"));
+  EXPECT_TRUE(was_logged("warning: Port line has to do without its input pin: " +
+                         std::string(g_strerror(ENOENT))));
   EXPECT_FALSE(io_port_get_state(port.get()));
   io_port_set_watch(port.get());
+}
+
+TEST_F(Pins, SupervisionOfAPortThatWasNotSetUpIsLoggedOnceUntilItIs) {
+  const std::string message =
+      "warning: Port line is supervised from now on, but was not set up: its line is not measured";
+  remove("class/gpio/gpio3");
+  const IOPortRef port = make(PORT_INPUT);
+  EXPECT_FALSE(io_port_setup(port.get()));
+  logged();
+  for (const bool on : {true, false, true}) {
+    EXPECT_TRUE(io_port_set_supervised(port.get(), on));
+  }
+  EXPECT_EQ(logged(), std::vector<std::string>{message});
+  make_line(3);
+  EXPECT_TRUE(io_port_setup(port.get()));
+  remove("class/gpio/gpio3");
+  EXPECT_FALSE(io_port_setup(port.get()));
+  EXPECT_TRUE(io_port_set_supervised(port.get(), true));
+  EXPECT_TRUE(was_logged(message));
 }
 
 TEST_F(Pins, AMeasuredPathThatCannotBeHadFailsTheSetUp) {

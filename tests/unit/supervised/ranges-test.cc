@@ -4,7 +4,7 @@
 
 #include "base/glib-ptr.h"
 #include "port/port-error.h"
-#include "supervised/supervised-utils.h"
+#include "supervised/supervised.h"
 #include "support/bench.h"
 #include "support/fake-ioctl.h"
 
@@ -16,7 +16,7 @@ using Words = std::vector<std::string>;
 
 class Ranges : public Bench {
  protected:
-  Ranges() : port(make_port(kSpiKind, PORT_INPUT, {})) { fake_spidev() = {}; }
+  Ranges() : port(make_port(BACKEND_SPI, PORT_INPUT, {})) { fake_spidev() = {}; }
 
   // The message of the refusal, or nothing when the range was taken.
   std::string set(const char *state, std::uint32_t lower, std::uint32_t upper,
@@ -46,7 +46,7 @@ TEST_F(Ranges, AnEmptyRangeIsRefused) {
 }
 
 TEST_F(Ranges, ALevelOfAPortWithoutRangesCannotBeClassified) {
-  const IOPortRef output = make_port(kSpiKind, PORT_OUTPUT, {});
+  const IOPortRef output = make_port(BACKEND_SPI, PORT_OUTPUT, {});
   io_port_restore_name(output.get(), "Siren", false);
   SupervisedRangeState state = SUPERVISED_STATE_OPEN;
   Error error;
@@ -95,7 +95,7 @@ TEST_F(Ranges, ANewRangeOfAStateTakesTheOldOnesPlaceAtTheEnd) {
 }
 
 TEST_F(Ranges, AnOutputHasNoRanges) {
-  port = make_port(kSpiKind, PORT_OUTPUT, {});
+  port = make_port(BACKEND_SPI, PORT_OUTPUT, {});
   int code = -1;
   EXPECT_EQ(set("open", 1, 2, &code), "Failed to get ranges from port.");
   EXPECT_EQ(code, IO_SUPERVISED_ERROR_GENERIC);
@@ -146,7 +146,7 @@ class Poll : public Ranges {
   }
 
   IOPortRef make_line_port(int number) {
-    IOPortRef made = make_port(kSpiKind, PORT_INPUT,
+    IOPortRef made = make_port(BACKEND_SPI, PORT_INPUT,
                                {{"input", "pin", "1"},
                                 {"io_ctrl", "pin", "2"},
                                 {"sio_ctrl", "pin", "3"},
@@ -246,7 +246,7 @@ TEST_F(Poll, APortThatIsFreedIsNoLongerPolled) {
 }
 
 TEST_F(Poll, APortThatIsNotSetUpIsNotPolled) {
-  port = make_port(kSpiKind, PORT_INPUT, {{"input", "pin", "1"}});
+  port = make_port(BACKEND_SPI, PORT_INPUT, {{"input", "pin", "1"}});
   supervise();
   EXPECT_EQ(timers(), std::vector<guint>{});
 }

@@ -66,18 +66,14 @@ void set_direction(IOPort *port, bool input) {
   data_of(port).calls.push_back(input ? "set_direction input" : "set_direction output");
 }
 
-void free_data(IOPort *port) {
-  io_port_set_backend_data(port, nullptr);
-}
-
 constexpr PortFunctions kOnlyIsSupervisable = {
+    .make_record = make_backend_record<FakeSupervisedData>,
     .setup = setup,
     .is_supervisable = is_supervisable,
     .get_state = get_state,
     .set_state = set_state,
     .start_watch = start_watch,
     .set_direction = set_direction,
-    .free = free_data,
 };
 
 constexpr PortFunctions with_all() {
@@ -99,26 +95,22 @@ constexpr PortFunctions without_ranges() {
 constexpr PortFunctions kAll = with_all();
 constexpr PortFunctions kNoRanges = without_ranges();
 
-template <const PortFunctions &functions>
-const PortFunctions *make(IOPort *port) {
-  io_port_make_backend_data<FakeSupervisedData>(port);
-  return &functions;
+const PortFunctions *functions_for(FakeSlots slots) {
+  switch (slots) {
+    case FakeSlots::all:
+      return &kAll;
+    case FakeSlots::no_ranges:
+      return &kNoRanges;
+    case FakeSlots::only_is_supervisable:
+      return &kOnlyIsSupervisable;
+  }
+  return nullptr;
 }
 
 }  // namespace
 
 void register_fake_supervised(FakeSlots slots) {
-  switch (slots) {
-    case FakeSlots::all:
-      io_port_register_backend(kFakeSupervisedKind, make<kAll>);
-      break;
-    case FakeSlots::no_ranges:
-      io_port_register_backend(kFakeSupervisedKind, make<kNoRanges>);
-      break;
-    case FakeSlots::only_is_supervisable:
-      io_port_register_backend(kFakeSupervisedKind, make<kOnlyIsSupervisable>);
-      break;
-  }
+  io_port_register_backend({"spi", kFakeSupervisedKind, functions_for(slots)});
 }
 
 FakeSupervisedData &fake_record(const IOPortRef &port) {

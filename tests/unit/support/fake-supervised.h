@@ -7,7 +7,7 @@
 #include "port/ioport.h"
 #include "support/recording-listener.h"
 
-inline constexpr int kFakeSupervisedKind = 3;
+inline constexpr BackendKind kFakeSupervisedKind = BACKEND_SPI;
 
 struct FakeSupervisedData : PortBackendData {
   bool supervisable = true;

@@ -7,7 +7,7 @@
 #include "port/port-registry.h"
 
 PortBuilder::PortBuilder() : port_(io_port_new()) {
-  io_port_set_backend(port_.get(), kCheckKind);
+  io_port_set_backend(port_.get(), BACKEND_CHECK);
   io_port_set_number(port_.get(), 1);
   io_port_set_id(port_.get(), "port");
   io_port_set_flag(port_.get(), "ioport", "true");
@@ -56,7 +56,7 @@ PortBuilder &PortBuilder::flag(const char *name, const char *value) {
   return *this;
 }
 
-PortBuilder &PortBuilder::backend(int kind) {
+PortBuilder &PortBuilder::backend(BackendKind kind) {
   io_port_set_backend(port_.get(), kind);
   return *this;
 }

@@ -6,11 +6,6 @@
 #include "backends/check-backend.h"
 #include "port/ioport.h"
 
-inline constexpr int kVirtualKind = 0;
-inline constexpr int kSysfsKind = 6;
-inline constexpr int kNullKind = 8;
-inline constexpr int kCheckKind = 9;
-
 // An input on the check backend, called "port", numbered 1 and flagged "ioport", until told
 // otherwise.
 class PortBuilder {
@@ -27,7 +22,7 @@ class PortBuilder {
   PortBuilder &number(int number);
   PortBuilder &id(const char *id);
   PortBuilder &flag(const char *name, const char *value = "true");
-  PortBuilder &backend(int kind);
+  PortBuilder &backend(BackendKind kind);
   PortBuilder &property(const char *section, const char *key, const char *value);
   PortBuilder &event(IoEvent event);
   PortBuilder &optional();

@@ -4,9 +4,8 @@
 
 #include <gtest/gtest.h>
 
-#include "backends/backends.h"
+#include "daemon/backends.h"
 #include "port/port-registry.h"
-#include "supervised/supervised-backends.h"
 #include "support/log-capture.h"
 #include "support/port-builder.h"
 #include "support/recording-listener.h"
@@ -14,10 +13,7 @@
 // Frees the ports of the registry at its end: references that a test holds must be gone by then.
 class PortFixture : public testing::Test {
  protected:
-  PortFixture() {
-    backends_register();
-    supervised_backends_register();
-  }
+  PortFixture() { backends_register(); }
   ~PortFixture() override { port_registry_drop_all(); }
 
   LogCapture log;

@@ -138,3 +138,12 @@ std::string Daemon::log() {
 bool Daemon::logged(const std::string &text) {
   return log().find(text) != std::string::npos;
 }
+
+int Daemon::log_count(const std::string &text) {
+  const std::string all = log();
+  int count = 0;
+  for (auto at = all.find(text); at != std::string::npos; at = all.find(text, at + text.size())) {
+    ++count;
+  }
+  return count;
+}

@@ -37,6 +37,7 @@ class Daemon {
   // All that it has printed since the test began.
   static std::string log();
   static bool logged(const std::string &text);
+  static int log_count(const std::string &text);
 
  private:
   void launch();

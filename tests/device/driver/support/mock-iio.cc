@@ -16,6 +16,7 @@ namespace {
 
 constexpr const char *kDevices = "/sys/bus/iio/devices";
 constexpr const char *kPlugged = "/sys/module/mock_iio/parameters/plugged";
+constexpr const char *kFailingReads = "/sys/module/mock_iio/parameters/failing_reads";
 constexpr const char *kScans = "/sys/module/mock_iio/parameters/scans";
 constexpr const char *kTriggers = "/sys/kernel/config/iio/triggers/hrtimer/";
 
@@ -64,6 +65,14 @@ UniqueFd MockIio::take_events(int device) {
   const UniqueFd file(open(node(device).c_str(), O_RDONLY | O_CLOEXEC));
   int events = -1;
   return UniqueFd(ioctl(file.get(), IIO_GET_EVENT_FD_IOCTL, &events) == 0 ? events : -1);
+}
+
+void MockIio::fail_reads(int count) {
+  write_text(kFailingReads, std::to_string(count));
+}
+
+int MockIio::reads_to_fail() {
+  return static_cast<int>(read_number(kFailingReads));
 }
 
 int MockIio::scans() {

@@ -21,6 +21,9 @@ class MockIio {
   static int event_attribute(int channel, const std::string &name, int device = 0);
   // The one descriptor for events, when nobody has it; an invalid one otherwise.
   static UniqueFd take_events(int device = 0);
+  // The next reads of raw values fail.
+  static void fail_reads(int count);
+  static int reads_to_fail();
   // How many scans the buffers were given since forget_scans().
   static int scans();
   static void forget_scans();

@@ -12,10 +12,9 @@
 #include <sstream>
 #include <utility>
 
-#include "backends/backends.h"
+#include "daemon/backends.h"
 #include "platform/host/ugpio-host.h"
 #include "port/port-listener.h"
-#include "supervised/supervised-backends.h"
 
 namespace {
 
@@ -30,13 +29,17 @@ std::vector<Timer> all_timers;
 std::vector<std::string> all_reports;
 std::vector<std::string> all_logged;
 std::vector<std::string> broken_files;
+std::vector<std::string> broken_devices;
 std::deque<std::string> coming_texts;
 
-bool is_broken(int fd) {
+bool is_broken(int fd, const std::vector<std::string> &broken) {
+  if (broken.empty()) {
+    return false;
+  }
   std::error_code error;
   const auto file = std::filesystem::read_symlink("/proc/self/fd/" + std::to_string(fd), error);
   errno = EIO;
-  return std::find(broken_files.begin(), broken_files.end(), file.string()) != broken_files.end();
+  return std::find(broken.begin(), broken.end(), file.string()) != broken.end();
 }
 
 // How the kernel takes a 64-bit offset depends on the machine; the C library knows.
@@ -99,13 +102,20 @@ extern "C" guint g_timeout_add(guint interval, GSourceFunc function, gpointer da
 // NOLINTNEXTLINE(readability-inconsistent-declaration-parameter-name): the library's are reserved.
 extern "C" ssize_t pread64(int fd, void *buffer, size_t size, off64_t offset) {
   static const auto real = real_call<ssize_t(int, void *, size_t, off64_t)>("pread64");
-  return is_broken(fd) ? -1 : real(fd, buffer, size, offset);
+  return is_broken(fd, broken_files) ? -1 : real(fd, buffer, size, offset);
 }
 
 // NOLINTNEXTLINE(readability-inconsistent-declaration-parameter-name)
 extern "C" ssize_t pwrite64(int fd, const void *buffer, size_t size, off64_t offset) {
   static const auto real = real_call<ssize_t(int, const void *, size_t, off64_t)>("pwrite64");
-  return is_broken(fd) ? -1 : real(fd, buffer, size, offset);
+  return is_broken(fd, broken_files) ? -1 : real(fd, buffer, size, offset);
+}
+
+// Samples are read with this.
+// NOLINTNEXTLINE(readability-inconsistent-declaration-parameter-name)
+extern "C" ssize_t read(int fd, void *buffer, size_t size) {
+  static const auto real = real_call<ssize_t(int, void *, size_t)>("read");
+  return is_broken(fd, broken_devices) ? -1 : real(fd, buffer, size);
 }
 
 // Attributes of the kernel are read with this.
@@ -136,7 +146,6 @@ Bench::Bench() {
   port_listener().port_changed = on_port_changed;
   port_listener().send_event = on_send_event;
   backends_register();
-  supervised_backends_register();
 }
 
 Bench::~Bench() {
@@ -194,11 +203,17 @@ void Bench::break_line(int number) const {
   broken_files.push_back(path("class/gpio/gpio" + std::to_string(number) + "/value"));
 }
 
+void Bench::break_reads(std::string_view name) const {
+  broken_devices.push_back(path(name));
+}
+
 void Bench::mend_lines() {
+  broken_devices.clear();
   broken_files.clear();
 }
 
-IOPortRef Bench::make_port(int kind, PortType type, const std::vector<Property> &properties) {
+IOPortRef Bench::make_port(BackendKind kind, PortType type,
+                           const std::vector<Property> &properties) {
   IOPortRef port(io_port_new());
   io_port_set_type(port.get(), type);
   io_port_restore_direction(port.get(), io_port_direction_input(port.get()));

@@ -13,10 +13,6 @@
 
 #include "port/ioport.h"
 
-inline constexpr int kSpiKind = 3;
-inline constexpr int kIioKind = 4;
-inline constexpr int kIioInterruptKind = 5;
-
 // One attribute of the hardware description.
 struct Property {
   const char *section;
@@ -47,11 +43,14 @@ class Bench : public testing::Test {
   bool line(int number) const;
   // From now on the line can neither be read nor driven, also through open descriptors.
   void break_line(int number) const;
-  static void mend_lines();
+  // From now on the device of that path can't be read.
+  void break_reads(std::string_view name) const;
+  static void mend_lines();  // and devices
 
   // --- Ports ---
   // A port with its backend bound and the properties applied, numbered 1.
-  static IOPortRef make_port(int kind, PortType type, const std::vector<Property> &properties);
+  static IOPortRef make_port(BackendKind kind, PortType type,
+                             const std::vector<Property> &properties);
   // Gives the port an event that tells the state of its line while it is supervised.
   static void add_supervised_event(const IOPortRef &port);
   static SupervisedRanges ranges_of(const IOPortRef &port);

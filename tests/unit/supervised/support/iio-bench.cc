@@ -100,6 +100,10 @@ void IioBench::make_threshold_converter(int number, const char *name) const {
     }
   }
   make_node(number);
+  make_events(number);
+}
+
+void IioBench::make_events(int number) const {
   EXPECT_EQ(mkfifo(path(node(number) + ".events").c_str(), 0600), 0);
 }
 

@@ -23,6 +23,7 @@ class IioBench : public Bench {
   void make_buffered_converter() const;
   // A converter with channels 0 and 1 at level 150, its node and the FIFO of its events.
   void make_threshold_converter(int number, const char *name) const;
+  void make_events(int number) const;
   int open_events(int number) const;
 
   // The state and level of a readout, or its error.

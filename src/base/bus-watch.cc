@@ -1,0 +1,89 @@
+#include "base/bus-watch.h"
+
+#include <optional>
+#include <utility>
+
+#include "base/main-queue.h"
+
+struct OwnerWatch::State : std::enable_shared_from_this<State> {
+  Changed changed;
+  GObjectPtr<GDBusConnection> connection;
+  std::string owner;
+  std::optional<std::string> told;  // what `changed` was last called with
+
+  void note(GDBusConnection *now_connection, const char *now_owner) {
+    connection.reset(now_connection ? static_cast<GDBusConnection *>(g_object_ref(now_connection))
+                                    : nullptr);
+    owner = now_owner;
+    // Told later: a name that changes hands first vanishes and then appears, in one go.
+    post_to_main_loop([watch = weak_from_this()] {
+      if (const auto state = watch.lock()) {
+        state->tell();
+      }
+    });
+  }
+
+  void tell() {
+    if (told != owner) {
+      told = owner;
+      changed(connection.get(), owner);
+    }
+  }
+
+  static void on_appeared(GDBusConnection *connection, const char * /*name*/, const char *owner,
+                          gpointer state) {
+    static_cast<State *>(state)->note(connection, owner);
+  }
+
+  static void on_vanished(GDBusConnection *connection, const char * /*name*/, gpointer state) {
+    static_cast<State *>(state)->note(connection, "");
+  }
+};
+
+OwnerWatch::OwnerWatch(const char *name, Changed changed) : state_(std::make_shared<State>()) {
+  state_->changed = std::move(changed);
+  id_ = g_bus_watch_name(G_BUS_TYPE_SYSTEM, name, G_BUS_NAME_WATCHER_FLAGS_AUTO_START,
+                         State::on_appeared, State::on_vanished, state_.get(), nullptr);
+}
+
+OwnerWatch::~OwnerWatch() {
+  g_bus_unwatch_name(id_);
+}
+
+namespace {
+
+void on_signal(GDBusConnection * /*connection*/, const char * /*sender*/, const char *object_path,
+               const char * /*interface*/, const char * /*member*/, GVariant *parameters,
+               gpointer heard) {
+  (*static_cast<SignalSubscription::Heard *>(heard))(object_path, parameters);
+}
+
+void free_heard(gpointer heard) {
+  delete static_cast<SignalSubscription::Heard *>(heard);
+}
+
+}  // namespace
+
+SignalSubscription::SignalSubscription(GDBusConnection *connection, const std::string &sender,
+                                       const char *interface, const char *member, Heard heard)
+    : connection_(static_cast<GDBusConnection *>(g_object_ref(connection))),
+      id_(g_dbus_connection_signal_subscribe(connection, sender.c_str(), interface, member, nullptr,
+                                             nullptr, G_DBUS_SIGNAL_FLAGS_NONE, on_signal,
+                                             new Heard(std::move(heard)), free_heard)) {}
+
+SignalSubscription::SignalSubscription(SignalSubscription &&other) noexcept
+    : connection_(std::move(other.connection_)), id_(std::exchange(other.id_, 0)) {}
+
+SignalSubscription &SignalSubscription::operator=(SignalSubscription &&other) noexcept {
+  reset();
+  connection_ = std::move(other.connection_);
+  id_ = std::exchange(other.id_, 0);
+  return *this;
+}
+
+void SignalSubscription::reset() {
+  if (id_ != 0) {
+    g_dbus_connection_signal_unsubscribe(connection_.get(), std::exchange(id_, 0));
+  }
+  connection_.reset();
+}

@@ -1,0 +1,60 @@
+#include "base/termination.h"
+
+#include <glib-unix.h>
+#include <poll.h>
+#include <unistd.h>
+
+#include <csignal>
+#include <string_view>
+#include <thread>
+
+#include "base/glib-ptr.h"
+
+namespace {
+
+// Within the five seconds that a daemon has to end.
+constexpr guint kLastResortMs = 4800;
+
+using MainContextPtr = std::unique_ptr<GMainContext, GlibDeleter<g_main_context_unref>>;
+using SourcePtr = std::unique_ptr<GSource, GlibDeleter<g_source_unref>>;
+
+// The log may be what hangs, or standard error, if nobody reads it.
+gboolean on_last_resort(gpointer /*user_data*/) {
+  constexpr std::string_view message = "portd did not end in time\n";
+  pollfd error_output = {.fd = STDERR_FILENO, .events = POLLOUT, .revents = 0};
+  if (poll(&error_output, 1, 0) > 0) {
+    [[maybe_unused]] const auto written = write(STDERR_FILENO, message.data(), message.size());
+  }
+  _exit(0);
+}
+
+gboolean on_sigterm(gpointer user_data) {
+  g_cancellable_cancel(termination_cancellable());
+  const SourcePtr last_resort(g_timeout_source_new(kLastResortMs));
+  g_source_set_callback(last_resort.get(), on_last_resort, nullptr, nullptr);
+  g_source_attach(last_resort.get(), static_cast<GMainContext *>(user_data));
+  return G_SOURCE_REMOVE;
+}
+
+void watch(GMainContext *context) {
+  const MainContextPtr owned(context);
+  while (true) {
+    g_main_context_iteration(context, TRUE);
+  }
+}
+
+}  // namespace
+
+GCancellable *termination_cancellable() {
+  // Never freed: the thread below may still use it when the process ends.
+  static GCancellable *const cancellable = g_cancellable_new();
+  return cancellable;
+}
+
+void termination_watch() {
+  GMainContext *context = g_main_context_new();
+  const SourcePtr sigterm(g_unix_signal_source_new(SIGTERM));
+  g_source_set_callback(sigterm.get(), on_sigterm, context, nullptr);
+  g_source_attach(sigterm.get(), context);
+  std::thread(watch, context).detach();
+}
