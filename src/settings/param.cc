@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "base/glib-ptr.h"
+#include "base/main-queue.h"
 #include "base/trusted-file.h"
 #include "platform/confutils.h"
 #include "port/ioport.h"
@@ -60,24 +61,6 @@ Waiting take_waiting(const std::string &file) {
   const std::lock_guard lock(waiting_lock);
   auto taken = waiting.extract(file);
   return taken ? std::move(taken.mapped()) : Waiting();
-}
-
-using Calls = std::vector<std::function<void()>>;
-
-gboolean make_calls(gpointer calls) {
-  for (const auto &call : *static_cast<Calls *>(calls)) {
-    if (call) {
-      call();
-    }
-  }
-  return G_SOURCE_REMOVE;
-}
-
-void call_from_main_loop(Calls calls) {
-  if (!calls.empty()) {
-    g_idle_add_full(G_PRIORITY_DEFAULT, make_calls, new Calls(std::move(calls)),
-                    [](gpointer made) { delete static_cast<Calls *>(made); });
-  }
 }
 
 std::vector<std::string> files_waited_for() {
@@ -174,7 +157,9 @@ void store(const std::string &file, Change change) {
     }
     change();
   });
-  call_from_main_loop(std::move(earlier.ended));
+  for (auto &ended : earlier.ended) {
+    post_to_main_loop(std::move(ended));
+  }
 }
 
 // On the thread of the storage writer.
@@ -227,7 +212,9 @@ void param_save_for_port(IOPort *ioport, const std::string &file) {
 void param_request_save(IOPort *ioport, const std::string &file, std::function<void()> ended) {
   auto settings = port_settings_take(ioport);
   if (!settings) {
-    call_from_main_loop({std::move(ended)});
+    if (ended) {
+      post_to_main_loop(std::move(ended));
+    }
     return;
   }
   add_waiting(file, std::move(*settings), std::move(ended));

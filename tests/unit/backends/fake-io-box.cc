@@ -12,9 +12,10 @@ namespace {
 
 constexpr std::int64_t kPatienceUs = 20'000'000;
 
+// Never destroyed: the backend's own proxies go later.
 std::vector<GDBusProxy *> &proxies() {
-  static std::vector<GDBusProxy *> alive;
-  return alive;
+  static auto *const alive = new std::vector<GDBusProxy *>;
+  return *alive;
 }
 
 void forget(gpointer /*user_data*/, GObject *where_the_object_was) {
