@@ -15,6 +15,9 @@ bool setup(IOPort *ioport, bool /*initial_level*/) {
   data->setup_ok = std::none_of(
       data->properties.begin(), data->properties.end(),
       [](const auto &property) { return property.key == "setup" && property.value == "fail"; });
+  if (!data->setup_ok) {
+    io_port_note_fault(ioport, "its description says so");
+  }
   return data->setup_ok;
 }
 

@@ -208,6 +208,7 @@ struct SetUp {
   Question question;
   IoBoxMode mode{};
   bool input = false;
+  const char *fault = nullptr;                // what keeps the port out of service
   bool usable = false;                        // the port's events are on
   std::optional<SupervisedRangeState> state;  // of an input
 };
@@ -215,16 +216,22 @@ struct SetUp {
 // On the worker's thread.
 void ask_box(SetUp &set_up, GCancellable *cancellable) {
   const IoBoxCall call = {monitor().proxy.get(), cancellable, set_up.patience.get()};
-  set_up.usable = iobox_is_connected(call) && iobox_port_is_enabled(call, set_up.mode.number);
-  if (!set_up.usable) {
+  if (!iobox_is_connected(call)) {
+    set_up.fault = "no I/O box is connected";
     return;
   }
+  if (!iobox_port_is_enabled(call, set_up.mode.number)) {
+    set_up.fault = "the I/O box does not have it enabled";
+    return;
+  }
+  set_up.usable = true;
   if (!set_up.input) {
     iobox_send_mode(call, set_up.mode);
     return;
   }
   set_up.state = ask_state(call, set_up.mode.number, set_up.question);
   if (!set_up.state) {
+    set_up.fault = "the I/O box does not tell its state";
     log_iobox(kLogLevelUser, kNoInitialState, "Could not get initial IO state");
   }
 }
@@ -236,20 +243,20 @@ void finish_set_up(const SetUp &set_up) {
   if (!data || data->heard != set_up.question.heard) {
     return;
   }
-  const bool works = set_up.usable && (!set_up.input || set_up.state);
   if (!set_up.input) {
     data->output_value = set_up.mode.level;
     note_level(data, set_up.mode.level);
   } else if (set_up.state && still_asked(set_up.question)) {
     data->state = *set_up.state;
   }
-  if (works) {
-    io_port_finish_setup(ioport);
-  } else {
+  if (set_up.fault) {
+    io_port_note_fault(ioport, "%s", set_up.fault);
     unfollow(data);
+  } else {
+    io_port_finish_setup(ioport);
   }
   io_port_set_events_enabled(ioport, set_up.usable);
-  if (works && !monitor().signals) {
+  if (!set_up.fault && !monitor().signals) {
     log_iobox(G_LOG_LEVEL_WARNING, kNoHandler, "Failed to setup signal handler");
   }
 }
@@ -261,6 +268,7 @@ bool iobox_port_setup(IOPort *ioport, bool initial_level) {
   data->watching = false;
   io_port_set_events_enabled(ioport, false);
   if (!make_proxy()) {
+    io_port_note_fault(ioport, "there is no proxy of %s", kService);
     return false;
   }
   data->connected = true;

@@ -1,5 +1,6 @@
 // Plain digital inputs and outputs on GPIO lines, and configurable ports, which have one line of
 // each kind and a third that switches the terminal between the two.
+#include <cerrno>
 #include <mutex>
 #include <string_view>
 
@@ -38,22 +39,24 @@ std::uint32_t get_state(IOPort *port) {
   return level != 0 ? 1 : 0;
 }
 
-int write_line(GpioBackendData *data, const GpioPinPtr &pin, int level) {
-  const std::lock_guard guard(data->lock);
-  return libugpio_write_gpio_pin(pin.get(), level);
+void drive(IOPort *port, const char *role, const GpioPinPtr &pin, int level, const char *failure) {
+  const std::lock_guard guard(data_of(port)->lock);
+  const bool driven = libugpio_write_gpio_pin(pin.get(), level) != -1;
+  const int reason = errno;
+  if (!driven) {
+    log_warning("%s", failure);
+  }
+  if (pin) {
+    libugpio_note_driven(port, role, pin.get(), driven, reason);
+  }
 }
 
 void set_state(IOPort *port, std::int32_t level) {
-  GpioBackendData *data = data_of(port);
-  if (write_line(data, data->output, level) == -1) {
-    log_warning("Failed to set state on port!\n");
-  }
+  drive(port, "output", data_of(port)->output, level, "Failed to set state on port!\n");
 }
 
-void switch_io_ctrl(GpioBackendData *data, int value) {
-  if (write_line(data, data->io_ctrl, value) == -1) {
-    log_warning("Couldn't change direction on port!\n");
-  }
+void switch_io_ctrl(IOPort *port, int value) {
+  drive(port, "io_ctrl", data_of(port)->io_ctrl, value, "Couldn't change direction on port!\n");
 }
 
 void start_watch(IOPort *port) {
@@ -65,11 +68,11 @@ void start_watch(IOPort *port) {
 
 void request_pin(IOPort *port, const GpioPinPtr &pin, const char *role, bool is_input, bool value) {
   if (!pin) {
+    io_port_note_fault(port, "no %s pin is described", role);
     log_warning("Port %s has no %s line", io_port_describe(port), role);
     return;
   }
-  // A port whose line can't be had lives on without it; why is in the log.
-  (void)libugpio_request_gpio_pin(pin.get(), is_input, value);
+  (void)libugpio_request_port_pin(port, role, pin.get(), is_input, value);
 }
 
 void setup_configurable(IOPort *port, const GpioBackendData *data, bool initial_level) {
@@ -104,9 +107,9 @@ void set_direction(IOPort *port, bool input) {
   data->edges.stop();
   if (input) {
     set_state(port, 0);
-    switch_io_ctrl(data, 0);
+    switch_io_ctrl(port, 0);
   } else {
-    switch_io_ctrl(data, 1);
+    switch_io_ctrl(port, 1);
     set_state(port, io_port_get_activelow(port, false) ? 1 : 0);
   }
 }

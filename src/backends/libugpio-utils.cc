@@ -2,8 +2,10 @@
 
 #include <cerrno>
 #include <string_view>
+#include <utility>
 
 #include "base/log.h"
+#include "port/ioport.h"
 
 namespace {
 
@@ -42,10 +44,15 @@ const char *prepare_line(const GpioPin *pin) {
 // A library that is not ours may not take a null handle as kindly.
 bool has_handle(const GpioPin *pin) {
   if (!pin || !pin->handle) {
-    errno = EINVAL;
+    errno = pin ? pin->refusal : EINVAL;
     return false;
   }
   return true;
+}
+
+// As the hardware description has it.
+std::string describe(const GpioPin *pin) {
+  return pin->alias ? *pin->alias : std::to_string(pin->pin);
 }
 
 }  // namespace
@@ -65,10 +72,35 @@ bool libugpio_request_gpio_pin(GpioPin *pin, bool is_input, bool value, GLogLeve
   if (pin->handle) {
     log_at(level, "%s", failure);
   } else {
+    pin->refusal = reason;
     log_at(level, "%s %d/%s", failure, pin->pin, libugpio_alias_text(pin));
   }
   errno = reason;
   return false;
+}
+
+bool libugpio_request_port_pin(IOPort *port, const char *role, GpioPin *pin, bool is_input,
+                               bool value, GLogLevelFlags level) {
+  const bool had = libugpio_request_gpio_pin(pin, is_input, value, level);
+  if (!had) {
+    libugpio_note_missing(port, role, pin);
+  }
+  return had;
+}
+
+void libugpio_note_missing(IOPort *port, const char *role, const GpioPin *pin) {
+  const char *reason = g_strerror(errno);
+  const std::string name = describe(pin);
+  io_port_note_fault(port, "%s pin %s: %s", role, name.c_str(), reason);
+  log_warning("Port %s has to do without its %s pin %s: %s", io_port_describe(port), role,
+              name.c_str(), reason);
+}
+
+void libugpio_note_driven(IOPort *port, const char *role, GpioPin *pin, bool driven, int reason) {
+  if (!std::exchange(pin->fault_logged, !driven) && !driven) {
+    log_warning("Port %s: its %s pin %s can't be driven: %s", io_port_describe(port), role,
+                describe(pin).c_str(), g_strerror(reason));
+  }
 }
 
 int libugpio_get_gpio_pin(const GpioPin *pin) {
@@ -85,7 +117,9 @@ bool libugpio_set_gpio_pin(const GpioPin *pin, int value) {
   if (libugpio_write_gpio_pin(pin, value) != -1) {
     return true;
   }
-  log_warning("Failed to set gpio pin %s: %s", libugpio_alias_text(pin), g_strerror(errno));
+  const int reason = errno;
+  log_warning("Failed to set gpio pin %s: %s", libugpio_alias_text(pin), g_strerror(reason));
+  errno = reason;
   return false;
 }
 

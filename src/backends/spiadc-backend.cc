@@ -45,15 +45,19 @@ bool setup(IOPort *port, bool /*initial_level*/) {
   SpiAdcBackendData *data = data_of(port);
   g_assert(data != NULL);
   if (io_port_get_type(port) != PORT_INPUT) {
+    io_port_note_fault(port, "an SPI ADC port can only be an input");
     log_warning("Port %s: an SPI ADC port can only be an input", io_port_describe(port));
     return false;
   }
   // A path that names a pipe, by mistake, must not hold the start until somebody writes to it.
   data->fd.reset(open(data->device.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
-  if (!data->fd) {
-    log_warning("Failed to open %s: %s", data->device.c_str(), g_strerror(errno));
+  if (data->fd) {
+    return true;
   }
-  return static_cast<bool>(data->fd);
+  const char *reason = g_strerror(errno);
+  io_port_note_fault(port, "%s: %s", data->device.c_str(), reason);
+  log_warning("Failed to open %s: %s", data->device.c_str(), reason);
+  return false;
 }
 
 std::uint32_t get_state(IOPort *port) {

@@ -40,16 +40,22 @@ bool setup(IOPort *port, bool /*initial_level*/) {
   SysfsBackendData *data = data_of(port);
   g_assert(data != NULL);
   if (io_port_get_type(port) != PORT_INPUT) {
+    io_port_note_fault(port, "a sysfs port can only be an input");
     log_warning("Port %s: a sysfs port can only be an input", io_port_describe(port));
     return false;
   }
   // A path that names a pipe, by mistake, must not hold the start until somebody writes to it.
   const int mode = data->clear_flag ? O_RDWR : O_RDONLY;
   data->fd.reset(open(data->path.c_str(), mode | O_NONBLOCK | O_CLOEXEC));
-  if (!data->fd && !io_port_is_optional(port)) {
-    log_warning("Failed to open %s: %s", data->path.c_str(), g_strerror(errno));
+  if (data->fd) {
+    return true;
   }
-  return static_cast<bool>(data->fd);
+  const char *reason = g_strerror(errno);
+  io_port_note_fault(port, "%s: %s", data->path.c_str(), reason);
+  if (!io_port_is_optional(port)) {
+    log_warning("Failed to open %s: %s", data->path.c_str(), reason);
+  }
+  return false;
 }
 
 std::uint32_t get_state(IOPort *ioport) {

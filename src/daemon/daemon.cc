@@ -197,6 +197,7 @@ void go_public() {
   }
   port_registry_arm_watches();
   port_registry_declare_events();
+  port_registry_log_service();
   start_manual_triggers();
 }
 

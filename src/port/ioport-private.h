@@ -72,6 +72,10 @@ struct IOPort {
   std::atomic<bool> events_enabled = true;
   std::atomic<bool> set_up = false;
 
+  // For the log. Main thread.
+  std::string fault;         // what was noted since the last set-up began
+  bool idle_logged = false;  // supervised without being set up, and the log says so
+
   // Serialises state writes, and keeps what a step sends apart from a new declaration. An action
   // thread holds it for each step, not between them.
   std::mutex lock;

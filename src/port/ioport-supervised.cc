@@ -1,6 +1,7 @@
 // Supervision of a port: forwarders to the backend, and the one rule that all backends share for
 // changing a range.
 #include <algorithm>
+#include <utility>
 
 #include "base/assert.h"
 #include "base/glib-ptr.h"
@@ -17,6 +18,14 @@ bool valid_limits(std::uint32_t lower, std::uint32_t upper) {
   const auto low = static_cast<std::int32_t>(lower);
   const auto high = static_cast<std::int32_t>(upper);
   return low < kLevelLimit && high < kLevelLimit && low < high;
+}
+
+// The setting is kept, and counts as soon as the port is set up: the call succeeds.
+void log_idle_supervision(IOPort *port) {
+  if (!port->set_up && port->supervised && !std::exchange(port->idle_logged, true)) {
+    log_warning("Port %s is supervised from now on, but its line is not measured: %s",
+                io_port_describe(port), io_port_fault(port).c_str());
+  }
 }
 
 }  // namespace
@@ -37,6 +46,7 @@ bool io_port_set_supervised(IOPort *port, bool supervised) {
   if (port->functions->set_supervised) {
     port->functions->set_supervised(port, supervised);
   }
+  log_idle_supervision(port);
   if (io_port_input(port)) {
     io_port_set_direction(port, true);
   }

@@ -2,7 +2,9 @@
 #include "port/ioport.h"
 
 #include <algorithm>
+#include <cstdarg>
 
+#include "base/glib-ptr.h"
 #include "base/log.h"
 #include "base/main-queue.h"
 #include "port/ioport-private.h"
@@ -140,9 +142,10 @@ bool io_port_begin_setup(IOPort *port) {
   g_assert(port != NULL);
   g_assert(port->functions != NULL);
   rebuild_released_backend(port);
+  port->fault.clear();
   const bool ok = !port->functions->setup || port->functions->setup(port, port->activelow_output);
   if (ok) {
-    port->set_up = true;
+    io_port_finish_setup(port);
   }
   return ok;
 }
@@ -166,6 +169,29 @@ bool io_port_is_set_up(const IOPort *ioport) {
 
 void io_port_finish_setup(IOPort *ioport) {
   ioport->set_up = true;
+  ioport->idle_logged = false;
+}
+
+void io_port_note_fault(IOPort *ioport, const char *format, ...) {
+  if (ioport->set_up) {
+    return;
+  }
+  va_list arguments;
+  va_start(arguments, format);
+  const GCharPtr text(g_strdup_vprintf(format, arguments));
+  va_end(arguments);
+  if (!ioport->fault.empty()) {
+    ioport->fault += "; ";
+  }
+  ioport->fault += text.get();
+}
+
+std::string io_port_fault(const IOPort *ioport) {
+  return ioport->fault.empty() && !ioport->set_up ? "its set-up failed" : ioport->fault;
+}
+
+bool io_port_in_service(const IOPort *ioport) {
+  return ioport->set_up && ioport->fault.empty();
 }
 
 void io_port_drop(IOPort *ioport) {

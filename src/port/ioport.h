@@ -78,6 +78,13 @@ bool io_port_setup(IOPort *ioport);
 bool io_port_is_set_up(const IOPort *ioport);
 // For a backend whose set-up had to ask a service first: the port is in service from now on.
 void io_port_finish_setup(IOPort *ioport);
+// Notes, for the log, what a set-up could not have: the port is out of service for it, or lacks a
+// part. Once the port is set up nothing more is noted; the next set-up begins with nothing.
+void io_port_note_fault(IOPort *ioport, const char *format, ...) G_GNUC_PRINTF(2, 3);
+// What was noted, as one text for a message: never empty for a port that is not set up.
+std::string io_port_fault(const IOPort *ioport);
+// Whether the port is set up and nothing was noted.
+bool io_port_in_service(const IOPort *ioport);
 // Takes the port out of service: ends a running sequence and lets the backend release what it
 // holds. The port reads 0 and refuses to be driven until it is set up again.
 void io_port_drop(IOPort *ioport);

@@ -34,10 +34,10 @@ std::unique_ptr<PortBackendData> make_backend_record() {
 struct PortFunctions {
   // Makes the private record of a port. Null: its ports have none.
   std::unique_ptr<PortBackendData> (*make_record)() = nullptr;
-  // Brings the hardware up; an output starts at the raw level `initial_level`. False: it could not,
-  // and the reason is in the log. Brought up already: begins anew; whether the port is still
-  // watched then is left open until its watch is armed again. A backend that has to wait for a
-  // service does that in the background (port-work.h): false for the moment, and
+  // Brings the hardware up; an output starts at the raw level `initial_level`. False: it could not;
+  // the reason is in the log, and noted with the port. Brought up already: begins anew; whether the
+  // port is still watched then is left open until its watch is armed again. A backend that has to
+  // wait for a service does that in the background (port-work.h): false for the moment, and
   // io_port_finish_setup() before the work ends where it came up. Null: always succeeds.
   bool (*setup)(IOPort *port, bool initial_level) = nullptr;
   // Also from action threads. Null: no port of the backend is.

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <iterator>
 #include <memory>
+#include <ranges>
 #include <utility>
 
 #include "base/log.h"
@@ -59,6 +60,7 @@ void set_up(IOPort *ioport) {
   if (io_port_has_backend(ioport)) {
     io_port_begin_setup(ioport);
   } else {
+    io_port_note_fault(ioport, "it has no backend");
     log_warning("Port %s has no backend and stays out of service", io_port_describe(ioport));
   }
 }
@@ -148,6 +150,20 @@ void retry_parked() {
       retry_parked();
     }
   });
+}
+
+// In the order of the description. Gives the number of those in service.
+std::size_t log_service_of(const std::vector<IOPortRef> &ports, const char *otherwise) {
+  std::size_t in_service = 0;
+  for (const auto &ioport : ports | std::views::reverse) {
+    if (io_port_in_service(ioport.get())) {
+      ++in_service;
+    } else {
+      log_warning("Port %s, number %d, is out of service %s: %s", io_port_describe(ioport.get()),
+                  ioport->number, otherwise, io_port_fault(ioport.get()).c_str());
+    }
+  }
+  return in_service;
 }
 
 std::string default_input_name(const IOPort *ioport, int inputs_seen) {
@@ -295,6 +311,14 @@ void port_registry_arm_watches() {
   for (const auto &ioport : snapshot_with_backend()) {
     io_port_set_watch(ioport.get());
   }
+}
+
+void port_registry_log_service() {
+  const auto listed = snapshot(registry().active);
+  const auto parked = snapshot(registry().parked);
+  const std::size_t in_service =
+      log_service_of(listed, "(listed)") + log_service_of(parked, "(not listed)");
+  log_info("%zu of %zu ports are in service", in_service, listed.size() + parked.size());
 }
 
 void port_registry_declare_events() {

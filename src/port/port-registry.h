@@ -53,6 +53,8 @@ void port_registry_retry_parked(std::function<void(std::size_t)> done);
 // Parks an optional port; others stay where they are.
 void port_registry_park(IOPort *ioport);
 void port_registry_arm_watches();
+// Says in the log how many ports are in service, and why each of the others is not.
+void port_registry_log_service();
 // Without the lock, since the event library may ask for the state of ports while it declares.
 void port_registry_declare_events();
 // Frees every port, whoever still holds references. Last thing at shutdown; waits for running

@@ -141,15 +141,18 @@ std::vector<std::string> iio_channel_attributes(const IioChannel &channel, int d
   return paths;
 }
 
-bool iio_channel_open(IioChannel *channel, int device, const IOPort *port) {
+bool iio_channel_open(IioChannel *channel, int device, IOPort *port) {
   const std::string prefix = attribute_prefix(*channel, device, "events/");
   ThresholdFiles files = open_threshold_files(prefix);
   if (!has_thresholds(files)) {
+    io_port_note_fault(port, "no thresholds can be set with %s...", prefix.c_str());
     log_warning("Port %s: no thresholds can be set with %s...", io_port_describe(port),
                 prefix.c_str());
   }
   const auto settings = shared_settings(*channel, device);
-  if (!std::all_of(settings.begin(), settings.end(), write_shared)) {
+  const auto missing = std::find_if_not(settings.begin(), settings.end(), write_shared);
+  if (missing != settings.end()) {
+    io_port_note_fault(port, "there is no %s", missing->path.c_str());
     return false;
   }
   channel->device = device;

@@ -44,7 +44,7 @@ bool iio_channel_set_property(IioChannel *channel, std::string_view key, const c
 std::vector<std::string> iio_channel_attributes(const IioChannel &channel, int device);
 // Opens the channel's files on that device and writes what the device's channels share. What was
 // open before stays when that fails: false, with a message.
-bool iio_channel_open(IioChannel *channel, int device, const IOPort *port);
+bool iio_channel_open(IioChannel *channel, int device, IOPort *port);
 // Reads the level into `value`. False, with a message and an error, when it can't be read. Any
 // thread.
 bool iio_channel_read(IioChannel *channel, GError **error);

@@ -43,7 +43,9 @@ IntDevicePtr find_device(const std::string &path) {
 UniqueFd get_event_descriptor(const UniqueFd &node) {
   int fd = -1;
   if (ioctl(node.get(), IIO_GET_EVENT_FD_IOCTL, &fd) < 0 || fd < 0) {
-    log_critical("Failed to open device: %s", g_strerror(errno));
+    const int reason = errno;
+    log_critical("Failed to open device: %s", g_strerror(reason));
+    errno = reason;
     return {};
   }
   UniqueFd events(fd);
@@ -57,7 +59,9 @@ UniqueFd get_event_descriptor(const UniqueFd &node) {
 UniqueFd open_events(const std::string &path) {
   const UniqueFd node(open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
   if (!node) {
-    log_critical("Failed to open device %s: %s", path.c_str(), g_strerror(errno));
+    const int reason = errno;
+    log_critical("Failed to open device %s: %s", path.c_str(), g_strerror(reason));
+    errno = reason;
     return {};
   }
   return get_event_descriptor(node);

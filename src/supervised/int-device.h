@@ -25,7 +25,7 @@ struct IntDevice {
 using IntDevicePtr = std::shared_ptr<IntDevice>;
 
 // The device that the ports on that path share, opened for the first of them; one that is gone is
-// opened anew. None, with a message, when it can't be had.
+// opened anew. None, with a message and errno, when it can't be had.
 IntDevicePtr int_device_get(const std::string &path);
 
 // What a port on a device is told.

@@ -85,12 +85,13 @@ std::string current_trigger(int adc) {
 }
 
 // The timer's trigger at its frequency, for the converter.
-bool setup_trigger(const IioSupervisedData *data, int adc) {
+bool setup_trigger(IOPort *port, const IioSupervisedData *data, int adc) {
   if (!data->hrtimer.empty()) {
     make_timer_trigger(data->hrtimer);
   }
   const int trigger = iio_find_number(data->hrtimer, IIO_KIND_TRIGGER);
   if (trigger < 0) {
+    io_port_note_fault(port, "there is no trigger %s", data->hrtimer.c_str());
     log_critical("Failed to find trigger");
     return false;
   }
@@ -119,10 +120,11 @@ void demand_usable_sample_type(const IioSupervisedData *backend) {
   g_assert(backend->iio_type.size % 8 == 0);
 }
 
-bool read_sample_type(IioSupervisedData *data, const std::string &path) {
+bool read_sample_type(IOPort *port, IioSupervisedData *data, const std::string &path) {
   const auto text = sysfs_read(path);
   const auto type = text ? iio_parse_sample_type(*text) : std::nullopt;
   if (!type) {
+    io_port_note_fault(port, "%s tells no sample type", path.c_str());
     log_critical("Failed to find device type: %s", path.c_str());
     return false;
   }
@@ -144,10 +146,12 @@ void enable_buffer(int device, const std::string &element) {
 
 // Reads never block: a spurious wake-up must not stop the daemon. What was open before stays when
 // the device can't be opened.
-bool open_device(IioSupervisedData *data) {
+bool open_device(IOPort *port, IioSupervisedData *data) {
   UniqueFd fresh(open(data->dev_path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
   if (!fresh) {
-    log_critical("Failed to open device: %s", g_strerror(errno));
+    const char *reason = g_strerror(errno);
+    io_port_note_fault(port, "%s: %s", data->dev_path.c_str(), reason);
+    log_critical("Failed to open device: %s", reason);
     return false;
   }
   data->fd = std::move(fresh);
@@ -155,24 +159,26 @@ bool open_device(IioSupervisedData *data) {
   return true;
 }
 
-bool iio_setup_sysfs(IioSupervisedData *data) {
+bool iio_setup_sysfs(IOPort *port, IioSupervisedData *data) {
   const int device = iio_find_number(data->name, IIO_KIND_DEVICE);
   const int adc = iio_find_number(data->adc, IIO_KIND_DEVICE);
   if (device < 0 || adc < 0) {
+    io_port_note_fault(port, "there is no converter %s",
+                       (device < 0 ? data->name : data->adc).c_str());
     log_critical("Failed to find device name: %d %d", device, adc);
     return false;
   }
   data->dev_path = data->node_of(device);
-  if (!setup_trigger(data, adc)) {
+  if (!setup_trigger(port, data, adc)) {
     return false;
   }
   const std::string element = scan_element(data, device);
   // A device that is back is the one that passed this before.
-  if (data->iio_type.bytes == 0 && !read_sample_type(data, element + "_type")) {
+  if (data->iio_type.bytes == 0 && !read_sample_type(port, data, element + "_type")) {
     return false;
   }
   enable_buffer(device, element);
-  return open_device(data);
+  return open_device(port, data);
 }
 
 // --- Samples ---
@@ -317,13 +323,13 @@ bool IioSupervisedData::set_control_pins(IOPort *port) {
 }
 
 // The device allows one user at a time, so an earlier descriptor goes first.
-bool IioSupervisedData::setup_line(IOPort * /*port*/) {
+bool IioSupervisedData::setup_line(IOPort *port) {
   fd.reset();
   iio_type = {};
   refusal_logged = false;
   lost = false;
   last_level = 0;
-  if (iio_setup_sysfs(this)) {
+  if (iio_setup_sysfs(port, this)) {
     return true;
   }
   log_critical("Failed to setup iio device.");
@@ -356,8 +362,8 @@ std::vector<std::string> IioSupervisedData::attributes_of(int device) const {
           trigger_frequency(iio_find_number(hrtimer, IIO_KIND_TRIGGER))};
 }
 
-bool IioSupervisedData::connect(IOPort * /*port*/) {
-  return iio_setup_sysfs(this);
+bool IioSupervisedData::connect(IOPort *port) {
+  return iio_setup_sysfs(port, this);
 }
 
 // A device that still can't be read is not worth another message; one that could be read last gets

@@ -350,12 +350,14 @@ std::vector<std::string> IioIntSupervisedData::attributes_of(int number) const {
 bool IioIntSupervisedData::connect(IOPort *port) {
   const int number = iio_find_number(driver, IIO_KIND_DEVICE);
   if (number < 0) {
+    io_port_note_fault(port, "there is no converter %s", driver.c_str());
     log_critical("Failed to find device name");
     log_critical("Failed to setup sysfs");
     return false;
   }
   IntDevicePtr found = int_device_get(node_of(number));
   if (!found) {
+    io_port_note_fault(port, "%s: %s", node_of(number).c_str(), g_strerror(errno));
     log_critical("Failed to open backend->device");
     return false;
   }

@@ -26,33 +26,32 @@ GpioPinPtr *pin_of_section(SupervisedPins *pins, std::string_view section) {
   return section == "output" ? &pins->output : nullptr;
 }
 
-// A port lives on without a pin that can't be had. The first message says at what it failed, the
-// second whose it is.
 void request_pin(IOPort *port, const GpioPinPtr &pin, const char *role, bool is_input, bool level) {
   if (!pin) {
     return;
   }
   log_info("Init pin: %s", libugpio_alias_text(pin.get()));
-  if (!libugpio_request_gpio_pin(pin.get(), is_input, level, G_LOG_LEVEL_CRITICAL)) {
-    log_warning("Port %s has to do without its %s pin: %s", io_port_describe(port), role,
-                g_strerror(errno));
-  }
+  (void)libugpio_request_port_pin(port, role, pin.get(), is_input, level, G_LOG_LEVEL_CRITICAL);
 }
 
 // The line keeps the direction that it has: the boot loader has set it.
-bool request_sio_ctrl(GpioPin &pin) {
+bool request_sio_ctrl(IOPort *port, GpioPin &pin) {
   libugpio_close_gpio_pin(&pin);
   pin.handle = pin.alias ? ugpio_request_named(pin.alias->c_str())
                          : ugpio_request(static_cast<unsigned int>(pin.pin), "sioctrl");
   if (!pin.handle) {
+    pin.refusal = errno;
+    libugpio_note_missing(port, "sio_ctrl", &pin);
     log_critical("Request for gpio pin %s failed.", libugpio_alias_text(&pin));
     return false;
   }
   if (ugpio_full_open(pin.handle) == -1) {
+    libugpio_note_missing(port, "sio_ctrl", &pin);
     log_critical("Failed to open gpio pin %s\n", libugpio_alias_text(&pin));
     return false;
   }
   if (ugpio_set_activelow(pin.handle, pin.inverted > 0 ? 1 : 0) != 0) {
+    libugpio_note_missing(port, "sio_ctrl", &pin);
     log_critical("Failed set active low!");
     return false;
   }
@@ -60,15 +59,24 @@ bool request_sio_ctrl(GpioPin &pin) {
 }
 
 // A board may lack a pin; there is nothing to drive then.
-bool drive(const GpioPinPtr &pin, bool level) {
+bool drive(IOPort *port, const char *role, const GpioPinPtr &pin, int level) {
   if (!pin) {
     return true;
   }
-  if (!libugpio_set_gpio_pin(pin.get(), level ? 1 : 0)) {
-    return false;
+  const bool driven = libugpio_set_gpio_pin(pin.get(), level);
+  libugpio_note_driven(port, role, pin.get(), driven, errno);
+  if (driven) {
+    pin->driven_high = level != 0;
   }
-  pin->driven_high = level;
-  return true;
+  return driven;
+}
+
+bool drive_io_ctrl(IOPort *port, bool on) {
+  return drive(port, "io_ctrl", pins_of(port)->io_ctrl, on ? 1 : 0);
+}
+
+bool drive_sio_ctrl(IOPort *port, bool on) {
+  return drive(port, "sio_ctrl", pins_of(port)->sio_ctrl, on ? 1 : 0);
 }
 
 // Whether the pins would do for the role that `levels` are meant for when sio_ctrl stays as it is.
@@ -109,11 +117,13 @@ bool supervised_check_pins(IOPort *port) {
   const bool output = pins->output != nullptr;
   if (io_port_get_type(port) == PORT_CONFIGURABLE) {
     if (!input || !output) {
+      io_port_note_fault(port, "it needs both an input and an output pin");
       log_critical("Supervised IO port should have both 'input' and 'output' pins.");
     }
     return input && output;
   }
   if (input == output) {
+    io_port_note_fault(port, "it needs either an input or an output pin");
     log_critical("Limited IO port should only have either 'input' or 'output' pin.");
   }
   return input != output;
@@ -139,26 +149,27 @@ bool supervised_request_control_pins(IOPort *port, bool sio_ctrl_optional) {
   }
   if (!pins->sio_ctrl) {
     if (!sio_ctrl_optional) {
+      io_port_note_fault(port, "no sio_ctrl pin is described");
       log_critical("Port %s has no sio_ctrl pin", io_port_describe(port));
     }
     return sio_ctrl_optional;
   }
-  return request_sio_ctrl(*pins->sio_ctrl);
+  return request_sio_ctrl(port, *pins->sio_ctrl);
 }
 
 bool supervised_drive_control_pins(IOPort *port, ControlLevels levels) {
   SupervisedPins *pins = pins_of(port);
   const std::lock_guard guard(pins->pins_lock);
-  if (!drive(pins->io_ctrl, levels.io_ctrl)) {
+  if (!drive_io_ctrl(port, levels.io_ctrl)) {
     log_critical("Failed to set ioctrl pin");
     return false;
   }
-  if (drive(pins->sio_ctrl, levels.sio_ctrl)) {
+  if (drive_sio_ctrl(port, levels.sio_ctrl)) {
     return true;
   }
   log_critical("Failed to set sioctrl pin");
   if (!fits(levels, pins->sio_ctrl->driven_high)) {
-    (void)drive(pins->io_ctrl, !levels.io_ctrl);
+    (void)drive_io_ctrl(port, !levels.io_ctrl);
   }
   return false;
 }
@@ -188,7 +199,7 @@ void supervised_set_state(IOPort *port, std::int32_t level) {
     return;
   }
   const std::lock_guard guard(pins->pins_lock);
-  (void)libugpio_set_gpio_pin(pins->output.get(), level);
+  (void)drive(port, "output", pins->output, level);
 }
 
 void supervised_set_edge_watch(IOPort *port, bool on) {

@@ -45,23 +45,20 @@ bool spi_set_control_pins(IOPort *port) {
 
 // --- Set-up ---
 
-bool open_device(SpiSupervisedData *data) {
+// Gives the failed step's message, with errno; null when the device is open.
+const char *open_device(SpiSupervisedData *data) {
   data->fd.reset(open(data->path.c_str(), O_RDWR | O_CLOEXEC));
   if (!data->fd) {
-    log_warning("Can't open %s: %s", data->path.c_str(), g_strerror(errno));
-    log_critical("Failed to open SPI device.");
-    return false;
+    return "Failed to open SPI device.";
   }
   std::uint8_t bits_per_word = 8;
   if (ioctl(data->fd.get(), SPI_IOC_WR_BITS_PER_WORD, &bits_per_word) < 0) {
-    log_critical("Failed to set bits per word.");
-    return false;
+    return "Failed to set bits per word.";
   }
   if (data->speed != 0 && ioctl(data->fd.get(), SPI_IOC_WR_MAX_SPEED_HZ, &data->speed) < 0) {
-    log_critical("Failed to set max speed.");
-    return false;
+    return "Failed to set max speed.";
   }
-  return true;
+  return nullptr;
 }
 
 // --- Operations ---
@@ -128,10 +125,15 @@ bool SpiSupervisedData::set_control_pins(IOPort *port) {
   return spi_set_control_pins(port);
 }
 
-bool SpiSupervisedData::setup_line(IOPort * /*port*/) {
-  if (open_device(this)) {
+bool SpiSupervisedData::setup_line(IOPort *port) {
+  const char *failure = open_device(this);
+  if (!failure) {
     return true;
   }
+  const char *reason = g_strerror(errno);
+  io_port_note_fault(port, "%s: %s", path.c_str(), reason);
+  log_warning("Can't use %s: %s", path.c_str(), reason);
+  log_critical("%s", failure);
   log_critical("Failed to open spi device.");
   return false;
 }

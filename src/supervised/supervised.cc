@@ -63,7 +63,6 @@ bool supervised_setup(IOPort *port, bool initial_level) {
   }
   supervised_request_pins(port, initial_level);
   line->initialised = io_port_get_type(port) == PORT_OUTPUT || setup_input(port, line);
-  line->idle_logged = line->idle_logged && !line->initialised;
   return line->initialised;
 }
 
@@ -79,9 +78,6 @@ bool supervised_set_supervised(IOPort *port, bool supervised) {
   }
   if (line->initialised) {
     (void)line->set_control_pins(port);
-  } else if (supervised && !std::exchange(line->idle_logged, true)) {
-    log_warning("Port %s is supervised from now on, but was not set up: its line is not measured",
-                io_port_describe(port));
   }
   return true;
 }

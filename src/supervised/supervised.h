@@ -26,7 +26,6 @@ struct SupervisedLine : SupervisedPins {
   // number, and ports that share one leave each other's alone.
   SupervisedRangeState last_state = SUPERVISED_STATE_UNDEFINED;
   bool initialised = false;  // set-up has succeeded and the port was not dropped since
-  bool idle_logged = false;  // supervised without being set up, and the log says so
 };
 
 // --- Operations for the backends' tables ---

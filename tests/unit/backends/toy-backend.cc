@@ -35,14 +35,16 @@ void set_property(IOPort *port, const char *section, const char *key, const char
 
 bool setup(IOPort *port, bool /*initial_level*/) {
   if (io_port_get_type(port) != PORT_INPUT) {
+    io_port_note_fault(port, "a toy port can only be an input");
     log_warning("Port %s: a toy port can only be an input", io_port_describe(port));
     return false;
   }
   ToyRecord *record = record_of(port);
   record->fd.reset(open(record->path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
   if (!record->fd) {
-    log_warning("Port %s: no %s: %s", io_port_describe(port), record->path.c_str(),
-                g_strerror(errno));
+    const char *reason = g_strerror(errno);
+    io_port_note_fault(port, "%s: %s", record->path.c_str(), reason);
+    log_warning("Port %s: no %s: %s", io_port_describe(port), record->path.c_str(), reason);
   }
   return static_cast<bool>(record->fd);
 }

@@ -10,9 +10,14 @@ using Calls = std::vector<std::string>;
 constexpr const char *kCouldNotSet = "Failed to set state on port!\n";
 constexpr const char *kCouldNotTurn = "Couldn't change direction on port!\n";
 
-const Calls kNoLineAllocated = {"Failed to allocate pin 1/(null)",
-                                "Failed to allocate pin 2/(null)",
-                                "Failed to allocate pin 3/(null)"};
+const Calls kNoLineAllocated = {
+    "Failed to allocate pin 1/(null)",
+    "Port terminal has to do without its input pin 1: Device or resource busy",
+    "Failed to allocate pin 2/(null)",
+    "Port terminal has to do without its output pin 2: Permission denied",
+    "Failed to allocate pin 3/(null)",
+    "Port terminal has to do without its io_ctrl pin 3: Device or resource busy"};
+constexpr const char *kNotDriven = "Port terminal: its output pin 2 can't be driven: ";
 const Calls kNoLineDescribed = {"Port terminal has no input line",
                                 "Port terminal has no output line",
                                 "Port terminal has no io_ctrl line"};
@@ -82,16 +87,36 @@ TEST_F(GpioBackendTest, AConfigurableOutputStartsInactiveWithItsDriverOn) {
 }
 
 TEST_F(GpioBackendTest, SetUpSucceedsWhenNoLineCanBeHad) {
-  for (const char *name : {"1", "2", "3"}) {
-    line(name).request_error = EBUSY;
-  }
+  line("1").request_error = EBUSY;
+  line("2").request_error = EACCES;
+  line("3").request_error = EBUSY;
   EXPECT_TRUE(io_port_setup(make_configurable()));
   EXPECT_EQ(log.take_warnings(), kNoLineAllocated);
+  EXPECT_FALSE(io_port_in_service(port()));
+  EXPECT_EQ(io_port_fault(port()),
+            "input pin 1: Device or resource busy; output pin 2: Permission denied; "
+            "io_ctrl pin 3: Device or resource busy");
+}
+
+TEST_F(GpioBackendTest, ALineThatCannotBePreparedIsNamedToo) {
+  line("2").activelow_error = EIO;
+  EXPECT_TRUE(io_port_setup(make_output()));
+  EXPECT_EQ(log.take_warnings(),
+            (Calls{"Failed set active low!",
+                   "Port terminal has to do without its output pin 2: Input/output error"}));
+  EXPECT_EQ(io_port_fault(port()), "output pin 2: Input/output error");
 }
 
 TEST_F(GpioBackendTest, SetUpSucceedsWhenTheDocumentForgetsThePins) {
   EXPECT_TRUE(io_port_setup(make(PORT_CONFIGURABLE, {})));
   EXPECT_EQ(log.take_warnings(), kNoLineDescribed);
+  EXPECT_EQ(io_port_fault(port()),
+            "no input pin is described; no output pin is described; no io_ctrl pin is described");
+}
+
+TEST_F(GpioBackendTest, APortThatHasItsLinesIsInService) {
+  EXPECT_TRUE(io_port_setup(make_configurable()));
+  EXPECT_TRUE(io_port_in_service(port()));
 }
 
 // --- Levels ---
@@ -127,8 +152,36 @@ TEST_F(GpioBackendTest, AnOutputThatCannotBeDrivenIsLogged) {
   EXPECT_TRUE(io_port_setup(make_output()));
   line("2").write_error = EIO;
   EXPECT_TRUE(io_port_set_state(port(), true));
-  EXPECT_TRUE(log.took_warning(kCouldNotSet));
+  EXPECT_EQ(log.take_warnings(),
+            (Calls{kCouldNotSet, kNotDriven + std::string("Input/output error")}));
   EXPECT_TRUE(reported().empty());
+}
+
+TEST_F(GpioBackendTest, WhichOutputCannotBeDrivenIsLoggedOnceUntilItCan) {
+  EXPECT_TRUE(io_port_setup(make_output()));
+  const std::string message = kNotDriven + std::string("Input/output error");
+  for (int round = 0; round < 2; ++round) {
+    line("2").write_error = EIO;
+    for (const bool state : {true, false, true}) {
+      EXPECT_TRUE(io_port_set_state(port(), state));
+    }
+    EXPECT_EQ(log.take_warnings(), (Calls{kCouldNotSet, message, kCouldNotSet, kCouldNotSet}));
+    line("2").write_error = 0;
+    EXPECT_TRUE(io_port_set_state(port(), true));
+    EXPECT_TRUE(log.empty());
+  }
+}
+
+TEST_F(GpioBackendTest, AnOutputThatWasRefusedSaysWhyWhenItIsDriven) {
+  line("siren").request_error = ENOENT;
+  make(PORT_OUTPUT, {{"output", "alias", "siren"}});
+  EXPECT_TRUE(io_port_setup(port()));
+  log.forget();
+  EXPECT_TRUE(io_port_set_state(port(), true));
+  EXPECT_EQ(
+      log.take_warnings(),
+      (Calls{kCouldNotSet,
+             "Port terminal: its output pin siren can't be driven: No such file or directory"}));
 }
 
 // --- Ports without a line ---
@@ -150,6 +203,9 @@ TEST_F(GpioBackendTest, APortWhoseLineIsRefusedLivesOn) {
   io_port_set_watch(port());
   EXPECT_GE(log.take_all(G_LOG_LEVEL_WARNING, kCouldNotSet), 3U);
   EXPECT_EQ(log.take_all(G_LOG_LEVEL_WARNING, kCouldNotTurn), 2U);
+  EXPECT_TRUE(log.took_warning(kNotDriven + std::string("Permission denied")));
+  EXPECT_TRUE(log.took_warning(
+      "Port terminal: its io_ctrl pin 3 can't be driven: Device or resource busy"));
   EXPECT_EQ(seams().fd_watches.size(), 0U);
   EXPECT_EQ(serve(), 0);
 }
@@ -174,6 +230,8 @@ TEST_F(GpioBackendTest, ALineThatDoesNotOpenReadsOneAndIsNotWatched) {
   EXPECT_TRUE(io_port_get_state(port()));
   EXPECT_EQ(seams().fd_watches.size(), 0U);
   EXPECT_TRUE(log.took_warning("Failed to open pin fd!"));
+  EXPECT_TRUE(
+      log.took_warning("Port terminal has to do without its input pin 1: Permission denied"));
 }
 
 // --- Direction ---
@@ -208,7 +266,10 @@ TEST_F(GpioBackendTest, ADriverThatCannotBeSwitchedIsLogged) {
   line("3").write_error = EIO;
   EXPECT_TRUE(io_port_set_direction(port(), false));
   EXPECT_TRUE(io_port_set_direction(port(), true));
-  EXPECT_EQ(log.take_all(G_LOG_LEVEL_WARNING, kCouldNotTurn), 2U);
+  EXPECT_EQ(
+      log.take_warnings(),
+      (Calls{kCouldNotTurn, "Port terminal: its io_ctrl pin 3 can't be driven: Input/output error",
+             kCouldNotTurn}));
 }
 
 TEST_F(GpioBackendTest, ReadsFollowTheDirection) {

@@ -102,7 +102,41 @@ TEST_F(RegistryService, KeepsAPortWithoutABackendOutOfService) {
   port_registry_add(bare.get());
   port_registry_setup_all();
   EXPECT_TRUE(log.took_warning("Port bare has no backend and stays out of service"));
+  EXPECT_EQ(io_port_fault(port_registry_nth(0).get()), "it has no backend");
   EXPECT_EQ(ids_in_order(), Lines{"bare"});
+}
+
+TEST_F(RegistryService, LogsHowManyPortsAreInServiceAndWhyTheOthersAreNot) {
+  add(port("door", 0));
+  add(failing("siren", 1));
+  add(failing("module", 2).optional());
+  add(port("gate", 3));
+  port_registry_setup_all();
+  port_registry_log_service();
+  EXPECT_EQ(log.take_warnings(),
+            (Lines{"Port siren, number 1, is out of service (listed): its description says so",
+                   "Port module, number 2, is out of service (not listed): its description says "
+                   "so"}));
+  EXPECT_TRUE(log.took(G_LOG_LEVEL_INFO, "2 of 4 ports are in service"));
+}
+
+TEST_F(RegistryService, LogsOneLineWhenAllPortsAreInService) {
+  add(port("door", 0));
+  port_registry_setup_all();
+  port_registry_log_service();
+  EXPECT_TRUE(log.took(G_LOG_LEVEL_INFO, "1 of 1 ports are in service"));
+  EXPECT_TRUE(log.empty());
+}
+
+TEST_F(RegistryService, AFaultIsForgottenWhenTheSetUpBeginsAnew) {
+  add(failing("module", 0).optional());
+  port_registry_setup_all();
+  const IOPortRef module = port_registry_find_parked(0);
+  EXPECT_FALSE(io_port_in_service(module.get()));
+  repair(module);
+  EXPECT_EQ(retry_parked(), 1U);
+  EXPECT_TRUE(io_port_in_service(module.get()));
+  EXPECT_EQ(io_port_fault(module.get()), "");
 }
 
 TEST_F(RegistryService, BringsAParkedPortBackOnceItWorks) {

@@ -1,4 +1,6 @@
 // The control pins: exactly one of them is on while a port is an input, none while it is an output.
+#include <algorithm>
+
 #include "support/bench.h"
 #include "support/fake-ioctl.h"
 
@@ -238,15 +240,18 @@ TEST_F(Pins, APlainPinThatCannotBeHadDoesNotFailTheSetUp) {
   const IOPortRef port = make(PORT_INPUT);
   EXPECT_TRUE(io_port_setup(port.get()));
   EXPECT_TRUE(was_logged("critical: Failed to allocate pin 1/(null)"));
-  EXPECT_TRUE(was_logged("warning: Port line has to do without its input pin: " +
+  EXPECT_TRUE(was_logged("warning: Port line has to do without its input pin 1: " +
                          std::string(g_strerror(ENOENT))));
+  EXPECT_EQ(io_port_fault(port.get()), "input pin 1: " + std::string(g_strerror(ENOENT)));
   EXPECT_FALSE(io_port_get_state(port.get()));
   io_port_set_watch(port.get());
 }
 
 TEST_F(Pins, SupervisionOfAPortThatWasNotSetUpIsLoggedOnceUntilItIs) {
   const std::string message =
-      "warning: Port line is supervised from now on, but was not set up: its line is not measured";
+      "warning: Port line is supervised from now on, but its line is not measured: sio_ctrl pin "
+      "3: " +
+      std::string(g_strerror(ENOENT));
   remove("class/gpio/gpio3");
   const IOPortRef port = make(PORT_INPUT);
   EXPECT_FALSE(io_port_setup(port.get()));
@@ -257,10 +262,45 @@ TEST_F(Pins, SupervisionOfAPortThatWasNotSetUpIsLoggedOnceUntilItIs) {
   EXPECT_EQ(logged(), std::vector<std::string>{message});
   make_line(3);
   EXPECT_TRUE(io_port_setup(port.get()));
+  EXPECT_TRUE(io_port_in_service(port.get()));
+  io_port_drop(port.get());
   remove("class/gpio/gpio3");
   EXPECT_FALSE(io_port_setup(port.get()));
   EXPECT_TRUE(io_port_set_supervised(port.get(), true));
   EXPECT_TRUE(was_logged(message));
+}
+
+TEST_F(Pins, AControlPinThatCannotBeDrivenIsNamedOnceUntilItCan) {
+  const std::string message = "warning: Port line: its io_ctrl pin 2 can't be driven: ";
+  const auto named = [&] {
+    const auto lines = logged();
+    return std::count_if(lines.begin(), lines.end(),
+                         [&](const std::string &line) { return line.starts_with(message); });
+  };
+  const IOPortRef port = make(PORT_INPUT);
+  EXPECT_TRUE(io_port_setup(port.get()));
+  for (int round = 0; round < 2; ++round) {
+    break_line(2);
+    EXPECT_TRUE(io_port_set_supervised(port.get(), true));
+    EXPECT_TRUE(io_port_set_supervised(port.get(), false));
+    EXPECT_EQ(named(), 1);
+    mend_lines();
+    EXPECT_TRUE(io_port_set_supervised(port.get(), true));
+    EXPECT_EQ(named(), 0);
+  }
+}
+
+TEST_F(Pins, WhatADocumentForgetsIsTheReason) {
+  const IOPortRef both = make_port(BACKEND_SPI, PORT_CONFIGURABLE, {{"input", "pin", "1"}});
+  EXPECT_FALSE(io_port_setup(both.get()));
+  EXPECT_EQ(io_port_fault(both.get()), "it needs both an input and an output pin");
+  const IOPortRef one = make_port(BACKEND_SPI, PORT_INPUT, {});
+  EXPECT_FALSE(io_port_setup(one.get()));
+  EXPECT_EQ(io_port_fault(one.get()), "it needs either an input or an output pin");
+  const IOPortRef control =
+      make_port(BACKEND_SPI, PORT_INPUT, {{"input", "pin", "1"}, {"io_ctrl", "pin", "2"}});
+  EXPECT_FALSE(io_port_setup(control.get()));
+  EXPECT_EQ(io_port_fault(control.get()), "no sio_ctrl pin is described");
 }
 
 TEST_F(Pins, AMeasuredPathThatCannotBeHadFailsTheSetUp) {
