@@ -6,39 +6,39 @@
 
 namespace {
 
-CheckBackendData *data_of(IOPort *ioport) {
-  return static_cast<CheckBackendData *>(io_port_backend_data(ioport));
+CheckBackendData *data_of(IOPort *port) {
+  return static_cast<CheckBackendData *>(io_port_backend_data(port));
 }
 
-bool setup(IOPort *ioport, bool /*initial_level*/) {
-  CheckBackendData *data = data_of(ioport);
+bool setup(IOPort *port, bool /*initial_level*/) {
+  CheckBackendData *data = data_of(port);
   data->setup_ok = std::none_of(
       data->properties.begin(), data->properties.end(),
       [](const auto &property) { return property.key == "setup" && property.value == "fail"; });
   if (!data->setup_ok) {
-    io_port_note_fault(ioport, "its description says so");
+    io_port_note_fault(port, "its description says so");
   }
   return data->setup_ok;
 }
 
-std::uint32_t get_state(IOPort *ioport) {
-  return static_cast<std::uint32_t>(data_of(ioport)->state);
+std::uint32_t get_state(IOPort *port) {
+  return static_cast<std::uint32_t>(data_of(port)->state);
 }
 
-void set_state(IOPort *ioport, std::int32_t level) {
-  data_of(ioport)->state = level;
+void set_state(IOPort *port, std::int32_t level) {
+  data_of(port)->state = level;
 }
 
-void start_watch(IOPort *ioport) {
-  data_of(ioport)->watching = true;
+void start_watch(IOPort *port) {
+  data_of(port)->watching = true;
 }
 
-void set_direction(IOPort *ioport, bool input) {
-  data_of(ioport)->direction = input ? 1 : 0;
+void set_direction(IOPort *port, bool input) {
+  data_of(port)->direction = input ? 1 : 0;
 }
 
-void set_property(IOPort *ioport, const char *section, const char *key, const char *value) {
-  data_of(ioport)->properties.push_front({section, key, value});
+void set_property(IOPort *port, const char *section, const char *key, const char *value) {
+  data_of(port)->properties.push_front({section, key, value});
 }
 
 }  // namespace

@@ -22,8 +22,8 @@ constexpr IoBoxPlace kNoProxy = {"iobox_port_setup", 168};
 constexpr IoBoxPlace kNoInitialState = {"iobox_port_setup", 219};
 constexpr IoBoxPlace kNoHandler = {"iobox_port_setup", 237};
 
-IoBoxBackendData *data_of(const IOPort *ioport) {
-  return static_cast<IoBoxBackendData *>(io_port_backend_data(ioport));
+IoBoxBackendData *data_of(const IOPort *port) {
+  return static_cast<IoBoxBackendData *>(io_port_backend_data(port));
 }
 
 // --- The service ---
@@ -52,35 +52,35 @@ void unfollow(IoBoxBackendData *data) {
   std::erase(monitor().ports, std::exchange(data->follower, nullptr));
 }
 
-void follow(IOPort *ioport) {
-  IoBoxBackendData *data = data_of(ioport);
+void follow(IOPort *port) {
+  IoBoxBackendData *data = data_of(port);
   unfollow(data);
-  data->follower = ioport;
-  monitor().ports.push_back(ioport);
+  data->follower = port;
+  monitor().ports.push_back(port);
 }
 
 // --- Modes ---
 
-const char *mode_word(const IOPort *ioport) {
-  if (!io_port_input(ioport)) {
+const char *mode_word(const IOPort *port) {
+  if (!io_port_input(port)) {
     return "out";
   }
-  return io_port_supervised_input(ioport) ? "supervised_in" : "in";
+  return io_port_supervised_input(port) ? "supervised_in" : "in";
 }
 
-IoBoxMode mode_of(const IOPort *ioport) {
-  return {io_port_get_number(ioport), data_of(ioport)->output_value, mode_word(ioport)};
+IoBoxMode mode_of(const IOPort *port) {
+  return {io_port_get_number(port), data_of(port)->output_value, mode_word(port)};
 }
 
 // Any thread. The box is told in the order of the calls of this.
-void iobox_set_mode(IOPort *ioport) {
-  IoBoxBackendData *data = data_of(ioport);
+void iobox_set_mode(IOPort *port) {
+  IoBoxBackendData *data = data_of(port);
   if (!data->connected) {
     return;
   }
-  const auto work = std::make_shared<PortWork>(ioport);
+  const auto work = std::make_shared<PortWork>(port);
   const std::lock_guard lock(data->mode_lock);
-  monitor().worker.queue([work, mode = mode_of(ioport)](GCancellable *cancellable) {
+  monitor().worker.queue([work, mode = mode_of(port)](GCancellable *cancellable) {
     iobox_send_mode(unhurried(cancellable), mode);
   });
 }
@@ -90,20 +90,20 @@ void note_level(IoBoxBackendData *data, std::int32_t level) {
 }
 
 // Any thread. The level counts from now on, however long the box takes.
-void drive(IOPort *ioport, std::int32_t level) {
-  IoBoxBackendData *data = data_of(ioport);
+void drive(IOPort *port, std::int32_t level) {
+  IoBoxBackendData *data = data_of(port);
   note_level(data, level);
   data->output_value = level;
-  iobox_set_mode(ioport);
+  iobox_set_mode(port);
 }
 
 // --- What the box says ---
 
-void take_state(IOPort *ioport, SupervisedRangeState state) {
-  IoBoxBackendData *data = data_of(ioport);
+void take_state(IOPort *port, SupervisedRangeState state) {
+  IoBoxBackendData *data = data_of(port);
   const auto now = static_cast<std::int32_t>(state);
   if (data->state.exchange(now) != now && data->watching) {
-    io_port_report_line(ioport, state);
+    io_port_report_line(port, state);
   }
 }
 
@@ -111,13 +111,13 @@ void take_state(IOPort *ioport, SupervisedRangeState state) {
 // be set up anew or become an output, and a signal may overtake the answer: where one was heard
 // since the question left, the answer says nothing newer.
 struct Question {
-  IOPort *ioport = nullptr;
+  IOPort *port = nullptr;
   IoBoxHeard heard;  // also tells one set-up of the port from the next
   unsigned heard_before = 0;
 };
 
 bool still_asked(const Question &question) {
-  const IoBoxBackendData *data = data_of(question.ioport);
+  const IoBoxBackendData *data = data_of(question.port);
   return data && data->heard == question.heard && *question.heard == question.heard_before;
 }
 
@@ -129,26 +129,26 @@ std::optional<SupervisedRangeState> ask_state(const IoBoxCall &call, int number,
 
 void on_proxy_signal(GDBusProxy * /*proxy*/, const char * /*sender*/, const char *signal,
                      GVariant *parameters, gpointer /*user_data*/) {
-  for (IOPort *ioport : std::vector<IOPort *>(monitor().ports)) {
-    iobox_handle_signal(ioport, signal, parameters);
+  for (IOPort *port : std::vector<IOPort *>(monitor().ports)) {
+    iobox_handle_signal(port, signal, parameters);
   }
 }
 
 // --- A service that is started anew knows neither modes nor whom it has told of which state ---
 
-void tell_anew(IOPort *ioport) {
-  const auto work = std::make_shared<PortWork>(ioport);
-  Question question = {ioport, data_of(ioport)->heard, 0};
-  const std::lock_guard lock(data_of(ioport)->mode_lock);
-  monitor().worker.queue([work, question, mode = mode_of(ioport),
-                          input = io_port_input(ioport)](GCancellable *cancellable) mutable {
+void tell_anew(IOPort *port) {
+  const auto work = std::make_shared<PortWork>(port);
+  Question question = {port, data_of(port)->heard, 0};
+  const std::lock_guard lock(data_of(port)->mode_lock);
+  monitor().worker.queue([work, question, mode = mode_of(port),
+                          input = io_port_input(port)](GCancellable *cancellable) mutable {
     const IoBoxCall call = unhurried(cancellable);
     iobox_send_mode(call, mode);
     const auto state = input ? ask_state(call, mode.number, question) : std::nullopt;
     if (state) {
       post_to_main_loop([work, question, state] {
-        if (still_asked(question) && io_port_input(question.ioport)) {
-          take_state(question.ioport, *state);
+        if (still_asked(question) && io_port_input(question.port)) {
+          take_state(question.port, *state);
         }
       });
     }
@@ -159,9 +159,9 @@ void on_owner_changed(GObject *proxy, GParamSpec * /*property*/, gpointer /*user
   if (!GCharPtr(g_dbus_proxy_get_name_owner(G_DBUS_PROXY(proxy)))) {
     return;
   }
-  for (IOPort *ioport : monitor().ports) {
-    if (io_port_is_set_up(ioport)) {
-      tell_anew(ioport);
+  for (IOPort *port : monitor().ports) {
+    if (io_port_is_set_up(port)) {
+      tell_anew(port);
     }
   }
 }
@@ -238,8 +238,8 @@ void ask_box(SetUp &set_up, GCancellable *cancellable) {
 
 // The state comes before the events, which say at once how the port is.
 void finish_set_up(const SetUp &set_up) {
-  IOPort *ioport = set_up.question.ioport;
-  IoBoxBackendData *data = data_of(ioport);
+  IOPort *port = set_up.question.port;
+  IoBoxBackendData *data = data_of(port);
   if (!data || data->heard != set_up.question.heard) {
     return;
   }
@@ -250,37 +250,37 @@ void finish_set_up(const SetUp &set_up) {
     data->state = *set_up.state;
   }
   if (set_up.fault) {
-    io_port_note_fault(ioport, "%s", set_up.fault);
+    io_port_note_fault(port, "%s", set_up.fault);
     unfollow(data);
   } else {
-    io_port_finish_setup(ioport);
+    io_port_finish_setup(port);
   }
-  io_port_set_events_enabled(ioport, set_up.usable);
+  io_port_set_events_enabled(port, set_up.usable);
   if (!set_up.fault && !monitor().signals) {
     log_iobox(G_LOG_LEVEL_WARNING, kNoHandler, "Failed to setup signal handler");
   }
 }
 
 // Signals are followed from here on, so that none is lost while the box is asked.
-bool iobox_port_setup(IOPort *ioport, bool initial_level) {
-  IoBoxBackendData *data = data_of(ioport);
+bool iobox_port_setup(IOPort *port, bool initial_level) {
+  IoBoxBackendData *data = data_of(port);
   data->connected = false;
   data->watching = false;
-  io_port_set_events_enabled(ioport, false);
+  io_port_set_events_enabled(port, false);
   if (!make_proxy()) {
-    io_port_note_fault(ioport, "there is no proxy of %s", kService);
+    io_port_note_fault(port, "there is no proxy of %s", kService);
     return false;
   }
   data->connected = true;
   data->state = SUPERVISED_STATE_UNDEFINED;
   data->heard = std::make_shared<std::atomic<unsigned>>(0U);
-  follow(ioport);
+  follow(port);
   SetUp set_up;
-  set_up.work = std::make_shared<PortWork>(ioport);
+  set_up.work = std::make_shared<PortWork>(port);
   set_up.patience = shared_patience();
-  set_up.question = {ioport, data->heard, 0};
-  set_up.mode = {io_port_get_number(ioport), initial_level, mode_word(ioport)};
-  set_up.input = io_port_input(ioport);
+  set_up.question = {port, data->heard, 0};
+  set_up.mode = {io_port_get_number(port), initial_level, mode_word(port)};
+  set_up.input = io_port_input(port);
   monitor().worker.queue([set_up](GCancellable *cancellable) mutable {
     ask_box(set_up, cancellable);
     post_to_main_loop([set_up] { finish_set_up(set_up); });
@@ -290,34 +290,34 @@ bool iobox_port_setup(IOPort *ioport, bool initial_level) {
 
 // --- Supervision: the box judges the line by itself, so the ranges are only kept ---
 
-bool is_supervisable(IOPort * /*ioport*/) {
+bool is_supervisable(IOPort * /*port*/) {
   return true;
 }
 
-bool set_supervised(IOPort *ioport, bool /*supervised*/) {
-  iobox_set_mode(ioport);
+bool set_supervised(IOPort *port, bool /*supervised*/) {
+  iobox_set_mode(port);
   return true;
 }
 
-SupervisedRanges get_supervised_ranges(IOPort *ioport) {
-  return io_port_range_list(ioport);
+SupervisedRanges get_supervised_ranges(IOPort *port) {
+  return io_port_range_list(port);
 }
 
-bool set_supervised_ranges(IOPort *ioport, SupervisedRanges ranges, GError ** /*error*/) {
-  io_port_store_range_list(ioport, std::move(ranges));
+bool set_supervised_ranges(IOPort *port, SupervisedRanges ranges, GError ** /*error*/) {
+  io_port_store_range_list(port, std::move(ranges));
   return true;
 }
 
 // --- State ---
 
 // A plain input has no use for the tamper states: a cut line reads inactive, a shorted one active.
-std::uint32_t get_state(IOPort *ioport) {
-  const IoBoxBackendData *data = data_of(ioport);
+std::uint32_t get_state(IOPort *port) {
+  const IoBoxBackendData *data = data_of(port);
   if (!data->connected) {
     return 0;
   }
   const auto state = static_cast<std::uint32_t>(data->state.load());
-  if (io_port_supervised_input(ioport)) {
+  if (io_port_supervised_input(port)) {
     return state;
   }
   switch (state) {
@@ -330,23 +330,23 @@ std::uint32_t get_state(IOPort *ioport) {
   }
 }
 
-bool get_supervised_readout(IOPort *ioport, SupervisedRangeState *state, std::uint32_t *level,
+bool get_supervised_readout(IOPort *port, SupervisedRangeState *state, std::uint32_t *level,
                             GError ** /*error*/) {
-  *state = static_cast<SupervisedRangeState>(get_state(ioport));
+  *state = static_cast<SupervisedRangeState>(get_state(port));
   *level = 0;
   return true;
 }
 
-void start_watch(IOPort *ioport) {
-  data_of(ioport)->watching = true;
+void start_watch(IOPort *port) {
+  data_of(port)->watching = true;
 }
 
 // An output has the level that the box is told, not the state that the line had as an input.
-void set_direction(IOPort *ioport, bool input) {
+void set_direction(IOPort *port, bool input) {
   if (!input) {
-    note_level(data_of(ioport), data_of(ioport)->output_value);
+    note_level(data_of(port), data_of(port)->output_value);
   }
-  iobox_set_mode(ioport);
+  iobox_set_mode(port);
 }
 
 }  // namespace
@@ -355,7 +355,7 @@ IoBoxBackendData::~IoBoxBackendData() {
   unfollow(this);
 }
 
-void iobox_handle_signal(IOPort *ioport, const char *signal, GVariant *parameters) {
+void iobox_handle_signal(IOPort *port, const char *signal, GVariant *parameters) {
   if (std::string_view(signal) != "IOStateChanged" ||
       !g_variant_is_of_type(parameters, G_VARIANT_TYPE("(is)"))) {
     return;
@@ -363,13 +363,13 @@ void iobox_handle_signal(IOPort *ioport, const char *signal, GVariant *parameter
   gint32 number = 0;
   const char *word = nullptr;
   g_variant_get(parameters, "(i&s)", &number, &word);
-  if (number != io_port_get_number(ioport)) {
+  if (number != io_port_get_number(port)) {
     return;
   }
-  if (const auto &heard = data_of(ioport)->heard) {
+  if (const auto &heard = data_of(port)->heard) {
     ++*heard;
   }
-  take_state(ioport, iobox_state_to_portd_state(word));
+  take_state(port, iobox_state_to_portd_state(word));
 }
 
 extern constexpr PortFunctions kIoBoxBackend = {

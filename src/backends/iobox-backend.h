@@ -35,4 +35,4 @@ struct IoBoxBackendData : PortBackendData {
 };
 
 // Serves a signal of the service for one port. What is not for it, or malformed, is ignored.
-void iobox_handle_signal(IOPort *ioport, const char *signal, GVariant *parameters);
+void iobox_handle_signal(IOPort *port, const char *signal, GVariant *parameters);

@@ -32,8 +32,8 @@ struct SysfsBackendData : PortBackendData {
   bool inverted = false;
 };
 
-SysfsBackendData *data_of(IOPort *ioport) {
-  return static_cast<SysfsBackendData *>(io_port_backend_data(ioport));
+SysfsBackendData *data_of(IOPort *port) {
+  return static_cast<SysfsBackendData *>(io_port_backend_data(port));
 }
 
 bool setup(IOPort *port, bool /*initial_level*/) {
@@ -58,8 +58,8 @@ bool setup(IOPort *port, bool /*initial_level*/) {
   return false;
 }
 
-std::uint32_t get_state(IOPort *ioport) {
-  return data_of(ioport)->state != 0 ? 1 : 0;
+std::uint32_t get_state(IOPort *port) {
+  return data_of(port)->state != 0 ? 1 : 0;
 }
 
 void seek_to_start(const SysfsBackendData *data) {

@@ -9,16 +9,16 @@ struct VirtualBackendData : PortBackendData {
   std::atomic<std::int32_t> state = 0;  // the last value set; action threads set it too
 };
 
-VirtualBackendData *data_of(IOPort *ioport) {
-  return static_cast<VirtualBackendData *>(io_port_backend_data(ioport));
+VirtualBackendData *data_of(IOPort *port) {
+  return static_cast<VirtualBackendData *>(io_port_backend_data(port));
 }
 
-std::uint32_t get_state(IOPort *ioport) {
-  return data_of(ioport)->state > 0 ? 1 : 0;
+std::uint32_t get_state(IOPort *port) {
+  return data_of(port)->state > 0 ? 1 : 0;
 }
 
-void set_state(IOPort *ioport, std::int32_t level) {
-  data_of(ioport)->state = level;
+void set_state(IOPort *port, std::int32_t level) {
+  data_of(port)->state = level;
 }
 
 }  // namespace

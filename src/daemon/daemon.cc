@@ -111,7 +111,7 @@ void load_hardware_description() {
 }
 
 void apply_settings() {
-  port_registry_for_each([](IOPort *ioport) { param_get_conf_vals(ioport); });
+  port_registry_for_each([](IOPort *port) { param_get_conf_vals(port); });
   param_free_configuration();
 }
 

@@ -26,10 +26,10 @@ Selection parse_description(const char *description) {
 // Every selected connector, in registry order. A port with both flags is one connector.
 void for_each_connector(const char *description, const std::function<void(IOPort *)> &visit) {
   const Selection selection = parse_description(description);
-  port_registry_for_each([&](IOPort *ioport) {
-    if ((selection.video && io_port_get_flag(ioport, "video_connector")) ||
-        (selection.audio && io_port_get_flag(ioport, "audio_connector"))) {
-      visit(ioport);
+  port_registry_for_each([&](IOPort *port) {
+    if ((selection.video && io_port_get_flag(port, "video_connector")) ||
+        (selection.audio && io_port_get_flag(port, "audio_connector"))) {
+      visit(port);
     }
   });
 }
@@ -37,7 +37,7 @@ void for_each_connector(const char *description, const std::function<void(IOPort
 gboolean get_num_connectors(PCDConnector *object, GDBusMethodInvocation *invocation,
                             const char *description, gpointer /*user_data*/) {
   gint count = 0;
-  for_each_connector(description, [&](IOPort * /*ioport*/) { ++count; });
+  for_each_connector(description, [&](IOPort * /*port*/) { ++count; });
   pcd_connector_complete_get_num_connectors(object, invocation, count);
   return TRUE;
 }
@@ -46,7 +46,7 @@ gboolean get_connector_states(PCDConnector *object, GDBusMethodInvocation *invoc
                               const char *description, gpointer /*user_data*/) {
   std::vector<gint32> states;
   for_each_connector(description,
-                     [&](IOPort *ioport) { states.push_back(io_port_get_state(ioport) ? 1 : 0); });
+                     [&](IOPort *port) { states.push_back(io_port_get_state(port) ? 1 : 0); });
   pcd_connector_complete_get_connector_states(
       object, invocation,
       g_variant_new_fixed_array(G_VARIANT_TYPE_INT32, states.data(), states.size(),

@@ -31,107 +31,106 @@ gboolean with_any_port(GDBusMethodInvocation *invocation, guint number, Serve se
   return serve_port(invocation, io_control_error_quark(), port_registry_find(number), serve);
 }
 
-void save(IOPort *ioport) {
-  param_request_save(ioport, kSettingsFile);
+void save(IOPort *port) {
+  param_request_save(port, kSettingsFile);
 }
 
 // Answers, and then stores the settings, once whatever the port waits for has answered: this caller
 // waits, nobody else does.
 template <typename Answer>
-void answer_and_save(IOPort *ioport, Answer answer) {
-  io_port_ref(ioport);
-  const std::shared_ptr<IOPort> port(ioport, io_port_unref);
-  io_port_when_settled(ioport, [port, answer] {
+void answer_and_save(IOPort *port, Answer answer) {
+  io_port_ref(port);
+  const std::shared_ptr<IOPort> kept(port, io_port_unref);
+  io_port_when_settled(port, [kept, answer] {
     answer();
-    save(port.get());
+    save(kept.get());
   });
 }
 
 gboolean get_state(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                    gpointer /*user_data*/) {
-  return with_port(invocation, number, [&](IOPort *ioport) {
-    iocontrol_state_complete_get_state(object, invocation, io_port_get_state(ioport));
+  return with_port(invocation, number, [&](IOPort *port) {
+    iocontrol_state_complete_get_state(object, invocation, io_port_get_state(port));
   });
 }
 
 gboolean set_state(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                    gboolean active, gpointer /*user_data*/) {
-  return with_port(invocation, number, [&](IOPort *ioport) {
-    if (!io_port_set_state(ioport, active)) {
+  return with_port(invocation, number, [&](IOPort *port) {
+    if (!io_port_set_state(port, active)) {
       return fail(invocation, IO_CONTROL_ERROR_NOT_OUTPUT, "Port not output.");
     }
-    answer_and_save(ioport, [=] { iocontrol_state_complete_set_state(object, invocation); });
+    answer_and_save(port, [=] { iocontrol_state_complete_set_state(object, invocation); });
   });
 }
 
 gboolean is_configurable(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                          gpointer /*user_data*/) {
-  return with_port(invocation, number, [&](IOPort *ioport) {
+  return with_port(invocation, number, [&](IOPort *port) {
     iocontrol_state_complete_is_configurable(object, invocation,
-                                             io_port_get_type(ioport) == PORT_CONFIGURABLE);
+                                             io_port_get_type(port) == PORT_CONFIGURABLE);
   });
 }
 
 gboolean get_direction(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                        gpointer /*user_data*/) {
-  return with_port(invocation, number, [&](IOPort *ioport) {
-    iocontrol_state_complete_get_direction(object, invocation,
-                                           direction_word(io_port_input(ioport)));
+  return with_port(invocation, number, [&](IOPort *port) {
+    iocontrol_state_complete_get_direction(object, invocation, direction_word(io_port_input(port)));
   });
 }
 
 // Stores the settings after a refusal too.
 gboolean set_direction(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                        const char *direction, gpointer /*user_data*/) {
-  return with_port(invocation, number, [&](IOPort *ioport) {
+  return with_port(invocation, number, [&](IOPort *port) {
     const auto input = parse_direction(direction);
     if (!input) {
       fail(invocation, IO_CONTROL_ERROR_GENERIC,
            "Incorrect input to set_direction eiter use 'input' or 'output'");
-    } else if (io_port_set_direction(ioport, *input)) {
-      return answer_and_save(ioport,
+    } else if (io_port_set_direction(port, *input)) {
+      return answer_and_save(port,
                              [=] { iocontrol_state_complete_set_direction(object, invocation); });
     } else {
       fail(invocation, IO_CONTROL_ERROR_NOT_CONFIGURABLE, "Port not configurable.");
     }
-    save(ioport);
+    save(port);
   });
 }
 
 gboolean get_active(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                     gpointer /*user_data*/) {
-  return with_port(invocation, number, [&](IOPort *ioport) {
+  return with_port(invocation, number, [&](IOPort *port) {
     iocontrol_state_complete_get_active(object, invocation,
-                                        activelow_word(io_port_get_activelow(ioport, true)),
-                                        activelow_word(io_port_get_activelow(ioport, false)));
+                                        activelow_word(io_port_get_activelow(port, true)),
+                                        activelow_word(io_port_get_activelow(port, false)));
   });
 }
 
 // Stores the settings after a refusal too.
 gboolean set_active(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                     gboolean input, const char *state, gpointer /*user_data*/) {
-  return with_port(invocation, number, [&](IOPort *ioport) {
+  return with_port(invocation, number, [&](IOPort *port) {
     const auto activelow = parse_activelow(state);
     if (!activelow) {
       fail(invocation, IO_CONTROL_ERROR_GENERIC,
            "Incorrect input to set_active eiter use 'open' or 'closed'");
-    } else if (io_port_set_activelow(ioport, *activelow, input)) {
-      return answer_and_save(ioport,
+    } else if (io_port_set_activelow(port, *activelow, input)) {
+      return answer_and_save(port,
                              [=] { iocontrol_state_complete_set_active(object, invocation); });
     } else {
       fail(invocation, IO_CONTROL_ERROR_GENERIC,
            *activelow ? "Could not set port to open." : "Could not set port to closed.");
     }
-    save(ioport);
+    save(port);
   });
 }
 
 gboolean get_names(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                    gpointer /*user_data*/) {
-  return with_port(invocation, number, [&](IOPort *ioport) {
+  return with_port(invocation, number, [&](IOPort *port) {
     std::optional<std::string> input;
     std::optional<std::string> output;
-    io_port_get_names(ioport, &input, &output);
+    io_port_get_names(port, &input, &output);
     iocontrol_state_complete_get_names(object, invocation, input.value_or("").c_str(),
                                        output.value_or("").c_str());
   });
@@ -139,26 +138,26 @@ gboolean get_names(IOControlState *object, GDBusMethodInvocation *invocation, gu
 
 gboolean set_name(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                   gboolean input, const char *name, gpointer /*user_data*/) {
-  return with_port(invocation, number, [&](IOPort *ioport) {
+  return with_port(invocation, number, [&](IOPort *port) {
     const auto set = input ? io_port_set_input_name : io_port_set_output_name;
-    if (!set(ioport, name)) {
+    if (!set(port, name)) {
       return fail(invocation, IO_CONTROL_ERROR_GENERIC,
                   input ? "Could not set input name for the port."
                         : "Could not set output name for the port.");
     }
     iocontrol_state_complete_set_name(object, invocation);
-    save(ioport);
+    save(port);
   });
 }
 
 gboolean set_virtual(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                      gboolean state, gpointer /*user_data*/) {
-  return with_any_port(invocation, number, [&](IOPort *ioport) {
-    if (!io_port_set_virtual(ioport, state)) {
+  return with_any_port(invocation, number, [&](IOPort *port) {
+    if (!io_port_set_virtual(port, state)) {
       return fail(invocation, IO_CONTROL_ERROR_GENERIC, "Could not set port.");
     }
     iocontrol_state_complete_set_virtual(object, invocation);
-    save(ioport);
+    save(port);
   });
 }
 
@@ -177,7 +176,7 @@ ActionSequence parse_sequence(bool is_virtual, GVariant *steps) {
 gboolean start_action_sequence(IOControlState *object, GDBusMethodInvocation *invocation,
                                guint number, gboolean is_virtual, GVariant *steps,
                                gpointer /*user_data*/) {
-  return with_any_port(invocation, number, [&](IOPort *ioport) {
+  return with_any_port(invocation, number, [&](IOPort *port) {
     if (g_variant_n_children(steps) > kMaxSequenceSteps) {
       return fail(invocation, IO_CONTROL_ERROR_GENERIC, "The sequence has too many steps.");
     }
@@ -185,10 +184,10 @@ gboolean start_action_sequence(IOControlState *object, GDBusMethodInvocation *in
     if (sequence.steps.empty()) {
       return fail(invocation, IO_CONTROL_ERROR_GENERIC, "The sequence has no steps.");
     }
-    if (io_port_is_busy(ioport)) {
+    if (io_port_is_busy(port)) {
       return fail(invocation, IO_CONTROL_ERROR_BUSY, "The port is busy.");
     }
-    if (!io_port_run_action_sequence(ioport, std::move(sequence))) {
+    if (!io_port_run_action_sequence(port, std::move(sequence))) {
       return fail(invocation, IO_CONTROL_ERROR_NOT_OUTPUT, "Port not output.");
     }
     iocontrol_state_complete_start_action_sequence(object, invocation);
@@ -202,21 +201,21 @@ gboolean get_nbr_ports(IOControlState *object, GDBusMethodInvocation *invocation
   return TRUE;
 }
 
-GVariant *flags_to_variant(const IOPort *ioport) {
+GVariant *flags_to_variant(const IOPort *port) {
   GVariantBuilder builder;
   g_variant_builder_init(&builder, G_VARIANT_TYPE("a(sb)"));
-  for (const auto &[name, value] : io_port_get_flags(ioport)) {
+  for (const auto &[name, value] : io_port_get_flags(port)) {
     g_variant_builder_add(&builder, "(sb)", name.c_str(), value);
   }
   return g_variant_builder_end(&builder);
 }
 
-GVariant *props_to_variant(IOPort *ioport) {
-  const bool input = io_port_direction_input(ioport);
-  return g_variant_new("(sibbbb@a(sb))", io_port_get_id(ioport).value_or("").c_str(),
-                       io_port_get_number(ioport), io_port_get_state(ioport), input,
-                       io_port_get_type(ioport) == PORT_CONFIGURABLE,
-                       io_port_get_activelow(ioport, input), flags_to_variant(ioport));
+GVariant *props_to_variant(IOPort *port) {
+  const bool input = io_port_direction_input(port);
+  return g_variant_new("(sibbbb@a(sb))", io_port_get_id(port).value_or("").c_str(),
+                       io_port_get_number(port), io_port_get_state(port), input,
+                       io_port_get_type(port) == PORT_CONFIGURABLE,
+                       io_port_get_activelow(port, input), flags_to_variant(port));
 }
 
 gboolean get_port_props(IOControlState *object, GDBusMethodInvocation *invocation,
@@ -226,8 +225,8 @@ gboolean get_port_props(IOControlState *object, GDBusMethodInvocation *invocatio
   g_variant_builder_init(&builder, G_VARIANT_TYPE("a(sibbbba(sb))"));
   {
     const auto lock = port_registry_lock();
-    for (IOPort *ioport : port_registry_active_locked()) {
-      g_variant_builder_add_value(&builder, props_to_variant(ioport));
+    for (IOPort *port : port_registry_active_locked()) {
+      g_variant_builder_add_value(&builder, props_to_variant(port));
       ++count;
     }
   }
@@ -244,12 +243,12 @@ void reannounce_ports() {
 }
 
 bool drop_port(const char *id) {
-  const IOPortRef ioport = port_registry_get_by_id(id);
-  if (!ioport || !io_port_is_optional(ioport.get())) {
+  const IOPortRef port = port_registry_get_by_id(id);
+  if (!port || !io_port_is_optional(port.get())) {
     return false;
   }
-  io_port_drop(ioport.get());
-  port_registry_park(ioport.get());
+  io_port_drop(port.get());
+  port_registry_park(port.get());
   return true;
 }
 

@@ -46,9 +46,9 @@ template <typename Serve>
 gboolean with_supervisable(GDBusMethodInvocation *invocation, guint number, Serve serve,
                            const char *not_supervisable = kNotSupervisable) {
   return serve_port(invocation, io_supervised_error_quark(), port_registry_find(number),
-                    [&](IOPort *ioport) {
-                      if (io_port_is_supervisable(ioport)) {
-                        serve(ioport);
+                    [&](IOPort *port) {
+                      if (io_port_is_supervisable(port)) {
+                        serve(port);
                       } else {
                         fail(invocation, IO_SUPERVISED_ERROR_NOT_SUPERVISABLE, not_supervisable);
                       }
@@ -64,37 +64,37 @@ gboolean get_number_of_ports(IOSupervisedSupervised *object, GDBusMethodInvocati
 
 gboolean is_supervisable(IOSupervisedSupervised *object, GDBusMethodInvocation *invocation,
                          guint number, gpointer /*user_data*/) {
-  return with_port(invocation, number, [&](IOPort *ioport) {
+  return with_port(invocation, number, [&](IOPort *port) {
     iosupervised_supervised_complete_is_supervisable(object, invocation,
-                                                     io_port_is_supervisable(ioport), FALSE);
+                                                     io_port_is_supervisable(port), FALSE);
   });
 }
 
 gboolean get_supervised(IOSupervisedSupervised *object, GDBusMethodInvocation *invocation,
                         guint number, gpointer /*user_data*/) {
-  return with_port(invocation, number, [&](IOPort *ioport) {
+  return with_port(invocation, number, [&](IOPort *port) {
     iosupervised_supervised_complete_get_supervised(object, invocation,
-                                                    io_port_is_supervised(ioport));
+                                                    io_port_is_supervised(port));
   });
 }
 
 gboolean set_supervised(IOSupervisedSupervised *object, GDBusMethodInvocation *invocation,
                         guint number, gboolean supervised, gpointer /*user_data*/) {
-  return with_port(invocation, number, [&](IOPort *ioport) {
-    if (io_port_is_supervised(ioport) != (supervised != FALSE)) {
-      if (!io_port_set_supervised(ioport, supervised)) {
+  return with_port(invocation, number, [&](IOPort *port) {
+    if (io_port_is_supervised(port) != (supervised != FALSE)) {
+      if (!io_port_set_supervised(port, supervised)) {
         return fail(invocation, IO_SUPERVISED_ERROR_NOT_SUPERVISABLE, kNotSupervisable);
       }
       // Whoever is answered finds the setting stored, after what the port waits for has answered.
-      io_port_ref(ioport);
-      const std::shared_ptr<IOPort> port(ioport, io_port_unref);
-      io_port_when_settled(ioport, [port, object, invocation] {
-        param_request_save(port.get(), kSettingsFile, [object, invocation] {
+      io_port_ref(port);
+      const std::shared_ptr<IOPort> kept(port, io_port_unref);
+      io_port_when_settled(port, [kept, object, invocation] {
+        param_request_save(kept.get(), kSettingsFile, [object, invocation] {
           iosupervised_supervised_complete_set_supervised(object, invocation);
         });
       });
       // Which of the port's events apply depends on whether it is supervised.
-      io_port_redeclare_events(ioport);
+      io_port_redeclare_events(port);
       return;
     }
     iosupervised_supervised_complete_set_supervised(object, invocation);
@@ -104,12 +104,12 @@ gboolean set_supervised(IOSupervisedSupervised *object, GDBusMethodInvocation *i
 gboolean set_supervised_ranges(IOSupervisedSupervised *object, GDBusMethodInvocation *invocation,
                                guint number, const char *state, guint lower, guint upper,
                                gpointer /*user_data*/) {
-  return with_supervisable(invocation, number, [&](IOPort *ioport) {
+  return with_supervisable(invocation, number, [&](IOPort *port) {
     Error error;
-    if (!io_port_set_supervised_range(ioport, state, lower, upper, error.out())) {
+    if (!io_port_set_supervised_range(port, state, lower, upper, error.out())) {
       return fail_with(invocation, error, "Could not set ranges.");
     }
-    param_request_save(ioport, kSettingsFile, [object, invocation] {
+    param_request_save(port, kSettingsFile, [object, invocation] {
       iosupervised_supervised_complete_set_supervised_ranges(object, invocation);
     });
   });
@@ -117,9 +117,9 @@ gboolean set_supervised_ranges(IOSupervisedSupervised *object, GDBusMethodInvoca
 
 gboolean get_supervised_ranges(IOSupervisedSupervised *object, GDBusMethodInvocation *invocation,
                                guint number, gpointer /*user_data*/) {
-  return with_supervisable(invocation, number, [&](IOPort *ioport) {
+  return with_supervisable(invocation, number, [&](IOPort *port) {
     SupervisedRanges ranges;
-    if (!io_port_get_supervised_ranges(ioport, &ranges)) {
+    if (!io_port_get_supervised_ranges(port, &ranges)) {
       return fail(invocation, IO_SUPERVISED_ERROR_GENERIC, "Could not get ranges.");
     }
     iosupervised_supervised_complete_get_supervised_ranges(object, invocation,
@@ -129,11 +129,11 @@ gboolean get_supervised_ranges(IOSupervisedSupervised *object, GDBusMethodInvoca
 
 gboolean get_supervised_readout(IOSupervisedSupervised *object, GDBusMethodInvocation *invocation,
                                 guint number, gpointer /*user_data*/) {
-  return with_supervisable(invocation, number, [&](IOPort *ioport) {
+  return with_supervisable(invocation, number, [&](IOPort *port) {
     SupervisedRangeState state = SUPERVISED_STATE_UNDEFINED;
     std::uint32_t level = 0;
     Error error;
-    if (!io_port_get_supervised_readout(ioport, &state, &level, error.out())) {
+    if (!io_port_get_supervised_readout(port, &state, &level, error.out())) {
       return fail_with(invocation, error, "Could not get supervised readout.");
     }
     iosupervised_supervised_complete_get_supervised_readout(
@@ -154,9 +154,9 @@ gboolean get_supervised_states(IOSupervisedSupervised *object, GDBusMethodInvoca
                                guint number, gpointer /*user_data*/) {
   return with_supervisable(
       invocation, number,
-      [&](IOPort *ioport) {
+      [&](IOPort *port) {
         std::vector<const char *> states;
-        if (!supervised_supported_states(ioport, &states)) {
+        if (!supervised_supported_states(port, &states)) {
           return fail(invocation, IO_SUPERVISED_ERROR_GENERIC, "Could not get supported states.");
         }
         iosupervised_supervised_complete_get_supervised_states(

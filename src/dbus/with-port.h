@@ -11,8 +11,8 @@
 
 // The port of the device that a client means by the number, or none.
 inline IOPortRef find_ioport(guint number) {
-  IOPortRef ioport = port_registry_find(number);
-  return io_port_is_ioport(ioport.get()) ? std::move(ioport) : nullptr;
+  IOPortRef port = port_registry_find(number);
+  return io_port_is_ioport(port.get()) ? std::move(port) : nullptr;
 }
 
 static_assert(int{IO_CONTROL_ERROR_NO_PORT} == int{IO_SUPERVISED_ERROR_NO_PORT});
@@ -20,10 +20,10 @@ static_assert(int{IO_CONTROL_ERROR_NO_PORT} == int{IO_SUPERVISED_ERROR_NO_PORT})
 // Has `serve` answer the call for the port. Without a port the call is refused, with the code that
 // both error domains have for that. The call is answered then: TRUE.
 template <typename Serve>
-gboolean serve_port(GDBusMethodInvocation *invocation, GQuark domain, const IOPortRef &ioport,
+gboolean serve_port(GDBusMethodInvocation *invocation, GQuark domain, const IOPortRef &port,
                     Serve serve) {
-  if (ioport) {
-    serve(ioport.get());
+  if (port) {
+    serve(port.get());
   } else {
     g_dbus_method_invocation_return_error_literal(invocation, domain, IO_CONTROL_ERROR_NO_PORT,
                                                   "No such port.");

@@ -33,44 +33,44 @@ const char *bit(bool value) {
   return value ? "1" : "0";
 }
 
-std::string populate_port_status(IOPort *ioport, int type) {
+std::string populate_port_status(IOPort *port, int type) {
   g_assert(type != EVENT_KEY_DOUBLE);
-  const bool state = io_port_get_state(ioport);
+  const bool state = io_port_get_state(port);
   return type == EVENT_KEY_STRING ? (state ? "true" : "false") : bit(state);
 }
 
-std::string populate_port_active(IOPort *ioport, int type) {
+std::string populate_port_active(IOPort *port, int type) {
   g_assert(type != EVENT_KEY_DOUBLE);
-  const bool state = io_port_get_state(ioport);
+  const bool state = io_port_get_state(port);
   return type == EVENT_KEY_STRING ? (state ? "active" : "inactive") : bit(state);
 }
 
-std::string populate_port_supervised_status(IOPort *ioport, int type) {
+std::string populate_port_supervised_status(IOPort *port, int type) {
   g_assert(type != EVENT_KEY_DOUBLE);
-  const SupervisedRangeState state = io_port_get_supervised_state(ioport);
+  const SupervisedRangeState state = io_port_get_supervised_state(port);
   if (type == EVENT_KEY_BOOL) {
     return bit(state == SUPERVISED_STATE_CLOSED);
   }
   return type == EVENT_KEY_INT ? std::to_string(state) : supervised_range_state2string(state);
 }
 
-std::string value_text(IOPort *ioport, const std::string &value, int type) {
+std::string value_text(IOPort *port, const std::string &value, int type) {
   if (value == "PORT_STATUS") {
-    return populate_port_status(ioport, type);
+    return populate_port_status(port, type);
   }
   if (value == "PORT_ACTIVE") {
-    return populate_port_active(ioport, type);
+    return populate_port_active(port, type);
   }
   if (value == "PORT_SUPERVISED_STATUS") {
-    return populate_port_supervised_status(ioport, type);
+    return populate_port_supervised_status(port, type);
   }
   return type == EVENT_KEY_BOOL ? bit(value == "true" || value == "1") : value;
 }
 
-bool populate_value(IOPort *ioport, const IoEventKey &key, Inspectable *inspectable) {
+bool populate_value(IOPort *port, const IoEventKey &key, Inspectable *inspectable) {
   const int type = key_type(key.type);
   g_assert(type != 0);
-  const std::string text = value_text(ioport, key.value.value_or(""), type);
+  const std::string text = value_text(port, key.value.value_or(""), type);
   const std::string name = key.name.value_or("");
   if (!inspectable_set_value_as_string(inspectable, name.c_str(), type, text.c_str())) {
     log_warning("populating event key value failed - Key: %s Val: %s Type: %s", name.c_str(),
@@ -80,20 +80,20 @@ bool populate_value(IOPort *ioport, const IoEventKey &key, Inspectable *inspecta
   return true;
 }
 
-std::optional<std::string> nice_name(IOPort *ioport, const std::optional<std::string> &text) {
-  return text == kPortName ? io_port_get_name(ioport) : text;
+std::optional<std::string> nice_name(IOPort *port, const std::optional<std::string> &text) {
+  return text == kPortName ? io_port_get_name(port) : text;
 }
 
 const char *text_or_null(const std::optional<std::string> &text) {
   return text ? text->c_str() : nullptr;
 }
 
-bool populate_nice_names(IOPort *ioport, const IoEventKey &key, Inspectable *inspectable) {
+bool populate_nice_names(IOPort *port, const IoEventKey &key, Inspectable *inspectable) {
   if (!key.key_nice_name && !key.value_nice_name) {
     return true;
   }
-  const auto key_name = nice_name(ioport, key.key_nice_name);
-  const auto value_name = nice_name(ioport, key.value_nice_name);
+  const auto key_name = nice_name(port, key.key_nice_name);
+  const auto value_name = nice_name(port, key.value_nice_name);
   if (!inspectable_set_nice_names(inspectable, text_or_null(key.name), text_or_null(key_name),
                                   text_or_null(value_name))) {
     const std::string key_text = key_name.value_or("");
@@ -128,10 +128,10 @@ const char *fault_of(const IoEventKey &key) {
 
 }  // namespace
 
-bool event_keys_are_sound(const IOPort *ioport, const std::list<IoEventKey> &keys) {
+bool event_keys_are_sound(const IOPort *port, const std::list<IoEventKey> &keys) {
   for (const auto &key : keys) {
     if (const char *fault = fault_of(key)) {
-      log_warning("Port %s: event key %s is of no use: %s", io_port_describe(ioport),
+      log_warning("Port %s: event key %s is of no use: %s", io_port_describe(port),
                   key.name.value_or("").c_str(), fault);
       return false;
     }
@@ -139,7 +139,7 @@ bool event_keys_are_sound(const IOPort *ioport, const std::list<IoEventKey> &key
   return true;
 }
 
-bool populate_event_values(IOPort *ioport, const std::list<IoEventKey> &keys,
+bool populate_event_values(IOPort *port, const std::list<IoEventKey> &keys,
                            Inspectable *inspectable, bool sending, std::string *property_key_out) {
   const IoEventKey *property = property_of(keys);
   for (const auto &key : keys) {
@@ -147,12 +147,12 @@ bool populate_event_values(IOPort *ioport, const std::list<IoEventKey> &keys,
     if (sending && !key.property) {
       continue;
     }
-    if (!sending && !populate_nice_names(ioport, key, inspectable)) {
+    if (!sending && !populate_nice_names(port, key, inspectable)) {
       return false;
     }
     if (!sending && &key == property) {
       *property_key_out = key.name.value_or("");
-    } else if (!populate_value(ioport, key, inspectable)) {
+    } else if (!populate_value(port, key, inspectable)) {
       return false;
     }
   }

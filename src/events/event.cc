@@ -51,8 +51,8 @@ IOPortRef port_of(gpointer user_data) {
 }
 
 void read_port_state(Inspectable *values, gpointer user_data) {
-  if (const IOPortRef ioport = port_of(user_data)) {
-    inspectable_set_bool(values, "state", io_port_get_state(ioport.get()));
+  if (const IOPortRef port = port_of(user_data)) {
+    inspectable_set_bool(values, "state", io_port_get_state(port.get()));
   }
 }
 
@@ -61,8 +61,8 @@ void read_any_port_state(Inspectable *values, gpointer /*user_data*/) {
 }
 
 void read_supervised_state(Inspectable *values, gpointer user_data) {
-  if (const IOPortRef ioport = port_of(user_data)) {
-    set_supervised_values(values, io_port_get_supervised_state(ioport.get()));
+  if (const IOPortRef port = port_of(user_data)) {
+    set_supervised_values(values, io_port_get_supervised_state(port.get()));
   }
 }
 
@@ -107,8 +107,8 @@ guint32 declare_port_event(int number, const char *port_name, EventPropertyCallb
   return event_producer_declare(producer, declaration.get());
 }
 
-guint32 declare_supervised(IOPort *ioport, const char *port_name) {
-  const int number = io_port_get_number(ioport);
+guint32 declare_supervised(IOPort *port, const char *port_name) {
+  const int number = io_port_get_number(port);
   const DeclarationPtr declaration(event_declaration_new());
   add_port(declaration.get(), number, port_name);
   add_data_key(declaration.get(), "tampered", EVENT_KEY_BOOL, "Tampered");
@@ -130,14 +130,14 @@ guint32 declare_port_any() {
 // --- Events that the hardware description describes ---
 
 // False with an error: the library refused to send. False without: there was nothing to send.
-bool send_described(IOPort *ioport, IoEvent *event, GError **error) {
+bool send_described(IOPort *port, IoEvent *event, GError **error) {
   const EventPtr prepared(event_producer_prepare_event(producer, event->id));
   if (!prepared) {
     log_warning("Failed to prepare event: %s id: %d", name_of(event).c_str(),
                 static_cast<int>(event->id));
     return false;
   }
-  if (!populate_event_values(ioport, event->keys, event_get_inspectable(prepared.get()), true,
+  if (!populate_event_values(port, event->keys, event_get_inspectable(prepared.get()), true,
                              nullptr)) {
     log_warning("Failed to populate event values");
     return false;
@@ -145,11 +145,11 @@ bool send_described(IOPort *ioport, IoEvent *event, GError **error) {
   return event_producer_send_event(producer, prepared.get(), error);
 }
 
-void send_initial_state(IOPort *ioport, IoEvent *event) {
+void send_initial_state(IOPort *port, IoEvent *event) {
   Error error;
-  if (!send_described(ioport, event, error.out())) {
+  if (!send_described(port, event, error.out())) {
     log_warning("Failed to send initial state of event %s for port %d", name_of(event).c_str(),
-                io_port_get_number(ioport));
+                io_port_get_number(port));
   }
 }
 
@@ -164,10 +164,10 @@ bool make_property(EventDeclaration *declaration, const std::string &key) {
   return true;
 }
 
-void declare_described(IOPort *ioport, IoEvent *event) {
+void declare_described(IOPort *port, IoEvent *event) {
   const std::string name = name_of(event);
-  const int number = io_port_get_number(ioport);
-  if (!event_keys_are_sound(ioport, event->keys)) {
+  const int number = io_port_get_number(port);
+  if (!event_keys_are_sound(port, event->keys)) {
     return;
   }
   const DeclarationPtr declaration(event_declaration_new_from_type(name.c_str()));
@@ -176,7 +176,7 @@ void declare_described(IOPort *ioport, IoEvent *event) {
     return;
   }
   std::string property_key;
-  if (!populate_event_values(ioport, event->keys,
+  if (!populate_event_values(port, event->keys,
                              event_declaration_get_inspectable(declaration.get()), false,
                              &property_key)) {
     log_warning("Failed to populate event declaration!");
@@ -191,7 +191,7 @@ void declare_described(IOPort *ioport, IoEvent *event) {
     return;
   }
   if (event_declaration_is_property(declaration.get()) && !event->declare_only) {
-    send_initial_state(ioport, event);
+    send_initial_state(port, event);
   }
 }
 
@@ -230,7 +230,7 @@ bool send_supervised(guint32 id, SupervisedRangeState state, GError **error) {
   return event_producer_send_event(producer, prepared.get(), error);
 }
 
-bool send_by_name(IOPort *ioport, IoEvent *event, std::int32_t value, GError **error) {
+bool send_by_name(IOPort *port, IoEvent *event, std::int32_t value, GError **error) {
   if (event->name == kPortEvent) {
     return send_state(event->id, value != 0, error);
   }
@@ -240,11 +240,11 @@ bool send_by_name(IOPort *ioport, IoEvent *event, std::int32_t value, GError **e
   if (event->name == kSupervisedEvent) {
     return send_supervised(event->id, static_cast<SupervisedRangeState>(value), error);
   }
-  return send_described(ioport, event, error);
+  return send_described(port, event, error);
 }
 
-void on_send_event(IOPort *ioport, IoEvent *event, std::int32_t value) {
-  io_event_send(ioport, event, value);
+void on_send_event(IOPort *port, IoEvent *event, std::int32_t value) {
+  io_event_send(port, event, value);
 }
 
 }  // namespace
@@ -263,20 +263,20 @@ void io_events_stop() {
   port_any_id = 0;
 }
 
-bool io_event_declare(IOPort *ioport, IoEvent *event) {
+bool io_event_declare(IOPort *port, IoEvent *event) {
   io_event_reset_filter(event);
-  if (!producer || event->id != 0 || !io_port_event_applies(ioport, *event)) {
+  if (!producer || event->id != 0 || !io_port_event_applies(port, *event)) {
     return true;
   }
-  const std::string port_name = io_port_get_name(ioport).value_or("");
+  const std::string port_name = io_port_get_name(port).value_or("");
   if (event->name == kPortEvent) {
-    event->id = declare_port_event(io_port_get_number(ioport), port_name.c_str(), read_port_state);
+    event->id = declare_port_event(io_port_get_number(port), port_name.c_str(), read_port_state);
   } else if (event->name == kPortAny) {
     event->id = declare_port_any();
   } else if (event->name == kSupervisedEvent) {
-    event->id = declare_supervised(ioport, port_name.c_str());
+    event->id = declare_supervised(port, port_name.c_str());
   } else {
-    declare_described(ioport, event);
+    declare_described(port, event);
   }
   return true;
 }
@@ -290,26 +290,26 @@ void io_event_undeclare(IoEvent *event) {
   }
 }
 
-void io_event_redeclare(IOPort *ioport, IoEvent *event) {
+void io_event_redeclare(IOPort *port, IoEvent *event) {
   if (event->name == kPortAny) {
     return;
   }
   io_event_undeclare(event);
-  io_event_declare(ioport, event);
+  io_event_declare(port, event);
 }
 
-bool io_event_send(IOPort *ioport, IoEvent *event, std::int32_t value) {
+bool io_event_send(IOPort *port, IoEvent *event, std::int32_t value) {
   if (event->id == 0 || !producer || event->declare_only) {
     return false;
   }
   if (event->name == kSupervisedEvent) {
-    value = static_cast<std::int32_t>(io_port_get_supervised_state(ioport));
+    value = static_cast<std::int32_t>(io_port_get_supervised_state(port));
   }
   if (is_repeat(event, value)) {
     return false;
   }
   Error error;
-  const bool sent = send_by_name(ioport, event, value, error.out());
+  const bool sent = send_by_name(port, event, value, error.out());
   if (error) {
     log_warning("Error sending event: %s", error.message());
   }

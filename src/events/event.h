@@ -17,12 +17,12 @@ void io_events_stop();
 
 // Declares the event if it applies to the port now and is not declared yet. Always true: what can't
 // be declared is logged, and is then never sent.
-bool io_event_declare(IOPort *ioport, IoEvent *event);
+bool io_event_declare(IOPort *port, IoEvent *event);
 // Withdraws the declaration. The any-port event, which ports share, stays.
 void io_event_undeclare(IoEvent *event);
 // Makes the declaration anew, as the port's name in it has changed. Not for the any-port event.
-void io_event_redeclare(IOPort *ioport, IoEvent *event);
+void io_event_redeclare(IOPort *port, IoEvent *event);
 // Sends the event. False when it was not sent: not declared, declared only, or a repeat.
-bool io_event_send(IOPort *ioport, IoEvent *event, std::int32_t value);
+bool io_event_send(IOPort *port, IoEvent *event, std::int32_t value);
 // Lets the next send pass the repeat filter.
 void io_event_reset_filter(IoEvent *event);

@@ -57,16 +57,16 @@ IoEvent trigger_event(int channel) {
 }
 
 IOPortRef manual_trigger_port_new(int channel) {
-  IOPortRef ioport(io_port_new());
-  io_port_set_type(ioport.get(), PORT_OUTPUT);
-  io_port_set_number(ioport.get(), port_number(channel));
-  io_port_set_id(ioport.get(), port_id(channel));
-  io_port_set_events_enabled(ioport.get(), false);
-  io_port_set_backend(ioport.get(), BACKEND_VIRTUAL);
-  io_port_set_flag(ioport.get(), "virtual", "true");
-  io_port_events(ioport.get()).push_front(trigger_event(channel));
-  io_port_setup(ioport.get());
-  return ioport;
+  IOPortRef port(io_port_new());
+  io_port_set_type(port.get(), PORT_OUTPUT);
+  io_port_set_number(port.get(), port_number(channel));
+  io_port_set_id(port.get(), port_id(channel));
+  io_port_set_events_enabled(port.get(), false);
+  io_port_set_backend(port.get(), BACKEND_VIRTUAL);
+  io_port_set_flag(port.get(), "virtual", "true");
+  io_port_events(port.get()).push_front(trigger_event(channel));
+  io_port_setup(port.get());
+  return port;
 }
 
 // Without camera control, what a trigger was when it was made is what it stays.
@@ -136,13 +136,13 @@ void manual_trigger_remove_channel(int channel) {
   std::unique_lock lock(triggers().lock);
   note_channel(triggers().enabled_channels, channel, false);
   lock.unlock();
-  const IOPortRef ioport = port_registry_get_by_id(port_id(channel));
-  if (!ioport) {
+  const IOPortRef port = port_registry_get_by_id(port_id(channel));
+  if (!port) {
     return;
   }
   port_registry_remove_by_id(port_id(channel));
-  io_port_drop(ioport.get());  // its sequence ends now, not when the last step has passed
-  io_port_set_events_enabled(ioport.get(), false);
+  io_port_drop(port.get());  // its sequence ends now, not when the last step has passed
+  io_port_set_events_enabled(port.get(), false);
 }
 
 void manual_trigger_clear() {

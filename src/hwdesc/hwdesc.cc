@@ -97,74 +97,74 @@ bool open_port(Loader &loader, const Attributes &attributes) {
   if (attribute != attributes.end() && attribute->name == "name") {
     port_registry_remove_by_id(attribute->value);
   }
-  const IOPortRef ioport(io_port_new());
-  port_registry_add(ioport.get());
+  const IOPortRef port(io_port_new());
+  port_registry_add(port.get());
   return true;
 }
 
-void apply_port(IOPort *ioport, const Attribute &attribute) {
+void apply_port(IOPort *port, const Attribute &attribute) {
   if (attribute.name == "name") {
-    io_port_set_id(ioport, attribute.value);
+    io_port_set_id(port, attribute.value);
   } else if (attribute.name == "optional") {
-    io_port_set_optional(ioport, std::string_view(attribute.value) == "true");
+    io_port_set_optional(port, std::string_view(attribute.value) == "true");
   }
 }
 
-void apply_port_type(IOPort *ioport, const Attribute &attribute) {
+void apply_port_type(IOPort *port, const Attribute &attribute) {
   if (attribute.name != "type") {
     return;
   }
   const std::string_view type = attribute.value;
   if (type == "io_ctrl") {
-    io_port_set_type(ioport, PORT_CONFIGURABLE);
+    io_port_set_type(port, PORT_CONFIGURABLE);
     return;
   }
   if (type == "input") {
-    io_port_set_type(ioport, PORT_INPUT);
+    io_port_set_type(port, PORT_INPUT);
   } else if (type == "output") {
-    io_port_set_type(ioport, PORT_OUTPUT);
+    io_port_set_type(port, PORT_OUTPUT);
   } else {
     log_critical("Unsupported port type %s\n", attribute.value);
   }
-  io_port_restore_direction(ioport, io_port_direction_input(ioport));
+  io_port_restore_direction(port, io_port_direction_input(port));
 }
 
-void apply_properties(IOPort *ioport, const Attribute &attribute) {
-  io_port_set_flag(ioport, std::string(attribute.name), attribute.value);
+void apply_properties(IOPort *port, const Attribute &attribute) {
+  io_port_set_flag(port, std::string(attribute.name), attribute.value);
 }
 
-void apply_port_no(IOPort *ioport, const Attribute &attribute) {
+void apply_port_no(IOPort *port, const Attribute &attribute) {
   if (attribute.name != "nbr") {
     return;
   }
   // The number that the port had until now is what counts: only giving a second one is odd.
-  if (io_port_get_number(ioport) >= kFirstVirtualPort) {
+  if (io_port_get_number(port) >= kFirstVirtualPort) {
     log_warning(
         "You have a port with higher number than FIRST_VIRTUAL_PORT this might lead to unexpected "
         "behaviour");
   }
-  io_port_set_number(ioport, parse_int(attribute.value));
+  io_port_set_number(port, parse_int(attribute.value));
 }
 
-void apply_param_default_name(IOPort *ioport, const Attribute &attribute) {
+void apply_param_default_name(IOPort *port, const Attribute &attribute) {
   if (attribute.name == "input" || attribute.name == "output") {
-    io_port_restore_name(ioport, attribute.value, attribute.name == "input");
+    io_port_restore_name(port, attribute.value, attribute.name == "input");
   }
 }
 
-void apply_backend(IOPort *ioport, const Attribute &attribute) {
+void apply_backend(IOPort *port, const Attribute &attribute) {
   if (attribute.name != "name") {
     return;
   }
   if (const auto kind = io_port_backend_kind(attribute.value)) {
-    io_port_set_backend(ioport, *kind);
+    io_port_set_backend(port, *kind);
   } else {
-    log_warning("Port %s: no backend is called %s", io_port_describe(ioport), attribute.value);
+    log_warning("Port %s: no backend is called %s", io_port_describe(port), attribute.value);
   }
 }
 
-void apply_event(IOPort *ioport, const Attribute &attribute) {
-  IoEvent &event = io_port_events(ioport).front();
+void apply_event(IOPort *port, const Attribute &attribute) {
+  IoEvent &event = io_port_events(port).front();
   if (attribute.name == "declaration") {
     event.name = attribute.value;
   } else if (attribute.name == "input") {
@@ -178,8 +178,8 @@ void apply_event(IOPort *ioport, const Attribute &attribute) {
   }
 }
 
-void apply_keyvalue(IOPort *ioport, const Attribute &attribute) {
-  auto &events = io_port_events(ioport);
+void apply_keyvalue(IOPort *port, const Attribute &attribute) {
+  auto &events = io_port_events(port);
   if (events.empty() || events.front().keys.empty()) {
     return;  // a key before any event; said when the element was opened
   }
@@ -199,14 +199,14 @@ void apply_keyvalue(IOPort *ioport, const Attribute &attribute) {
   }
 }
 
-void open_event(IOPort *ioport) {
-  io_port_events(ioport).emplace_front();
+void open_event(IOPort *port) {
+  io_port_events(port).emplace_front();
 }
 
-void open_keyvalue(IOPort *ioport) {
-  auto &events = io_port_events(ioport);
+void open_keyvalue(IOPort *port) {
+  auto &events = io_port_events(port);
   if (events.empty()) {
-    log_warning("Port %s: a key stands before any event", io_port_describe(ioport));
+    log_warning("Port %s: a key stands before any event", io_port_describe(port));
     return;
   }
   events.front().keys.emplace_front();
@@ -214,8 +214,8 @@ void open_keyvalue(IOPort *ioport) {
 
 struct Element {
   std::string_view name;
-  void (*open)(IOPort *ioport);  // null: nothing is made
-  void (*apply)(IOPort *ioport, const Attribute &attribute);
+  void (*open)(IOPort *port);  // null: nothing is made
+  void (*apply)(IOPort *port, const Attribute &attribute);
   std::string_view attributes;  // that mean something, each between blanks; empty: any may
 };
 
@@ -261,23 +261,23 @@ bool names_backend(const Element *element, const Attribute &attribute) {
 // Hands each attribute to the backend while its part of the document lasts, then to the port.
 void apply_element(Loader &loader, const char *name, const Element *element,
                    const Attributes &attributes) {
-  const IOPortRef ioport = port_registry_nth(0);
-  if (!ioport) {
+  const IOPortRef port = port_registry_nth(0);
+  if (!port) {
     if (element) {
       log_warning("Element %s stands before any port", name);
     }
     return;
   }
   if (element && element->open) {
-    element->open(ioport.get());
+    element->open(port.get());
   }
   for (const auto &attribute : attributes) {
     if (loader.in_backend) {
-      io_port_set_backend_property(ioport.get(), name, std::string(attribute.name).c_str(),
+      io_port_set_backend_property(port.get(), name, std::string(attribute.name).c_str(),
                                    attribute.value);
     }
     if (element) {
-      element->apply(ioport.get(), attribute);
+      element->apply(port.get(), attribute);
       met_oddity |= !loader.in_backend && !means_something(*element, attribute);
     }
     if (names_backend(element, attribute)) {

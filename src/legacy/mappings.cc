@@ -26,9 +26,9 @@ constexpr const char *kMappings = "/etc/legacyconfig/legacymappings.d/portd.xml"
 std::vector<LegacyPort> legacy_ports() {
   std::vector<LegacyPort> ports;
   for (std::uint32_t number = 0; number < port_registry_count(); ++number) {
-    const IOPortRef ioport = port_registry_find(number);
-    if (io_port_is_ioport(ioport.get())) {
-      ports.push_back({io_port_get_number(ioport.get()), io_port_get_type(ioport.get())});
+    const IOPortRef port = port_registry_find(number);
+    if (io_port_is_ioport(port.get())) {
+      ports.push_back({io_port_get_number(port.get()), io_port_get_type(port.get())});
     }
   }
   return ports;

@@ -32,8 +32,8 @@ constexpr GDBusInterfaceVTable kCallbacks = {iocontrol_conf_legacy_dbus_handle_m
 std::set<int> numbers_below(int count) {
   std::set<int> numbers;
   const auto lock = port_registry_lock();
-  for (const IOPort *ioport : port_registry_active_locked()) {
-    const int number = io_port_get_number(ioport);
+  for (const IOPort *port : port_registry_active_locked()) {
+    const int number = io_port_get_number(port);
     if (number >= 0 && number < count) {
       numbers.insert(number);
     }
@@ -47,13 +47,13 @@ void register_or_end(LegacyController &controller, int number, LegacyInterface i
   }
 }
 
-void register_port(LegacyController &controller, const IOPort *ioport) {
-  const int number = io_port_get_number(ioport);
+void register_port(LegacyController &controller, const IOPort *port) {
+  const int number = io_port_get_number(port);
   register_or_end(controller, number, LEGACY_INTERFACE_PORT);
-  if (io_port_get_type(ioport) != PORT_OUTPUT) {
+  if (io_port_get_type(port) != PORT_OUTPUT) {
     register_or_end(controller, number, LEGACY_INTERFACE_INPUT);
   }
-  if (io_port_get_type(ioport) != PORT_INPUT) {
+  if (io_port_get_type(port) != PORT_INPUT) {
     register_or_end(controller, number, LEGACY_INTERFACE_OUTPUT);
   }
 }
@@ -138,8 +138,8 @@ void legacy_register_objects(LegacyController &controller) {
     register_or_end(controller, 0, LEGACY_INTERFACE_PORT);
   }
   for (const int number : numbers_below(count)) {
-    if (const IOPortRef ioport = port_registry_find(static_cast<std::uint32_t>(number))) {
-      register_port(controller, ioport.get());
+    if (const IOPortRef port = port_registry_find(static_cast<std::uint32_t>(number))) {
+      register_port(controller, port.get());
     }
   }
 }

@@ -25,16 +25,16 @@ constexpr unsigned kDecimal = 10;
 IOPortRef find_port(const char *object_path, GError **error) {
   const std::string prefix = std::string(kLegacyBasePath) + "/";
   guint64 number = 0;
-  IOPortRef ioport;
+  IOPortRef port;
   if (g_str_has_prefix(object_path, prefix.c_str()) &&
       g_ascii_string_to_unsigned(object_path + prefix.size(), kDecimal, 0, G_MAXINT, &number,
                                  nullptr)) {
-    ioport = port_registry_find(static_cast<std::uint32_t>(number));
+    port = port_registry_find(static_cast<std::uint32_t>(number));
   }
-  if (!ioport) {
+  if (!port) {
     g_set_error_literal(error, io_control_error_quark(), IO_CONTROL_ERROR_NO_PORT, "No such port.");
   }
-  return ioport;
+  return port;
 }
 
 bool contains(std::string_view text, std::string_view part) {
@@ -52,52 +52,52 @@ GVariant *new_count(std::uint32_t count) {
   return g_variant_new_int32(static_cast<gint32>(count));
 }
 
-GVariant *get_name(const IOPort *ioport, std::string_view interface) {
+GVariant *get_name(const IOPort *port, std::string_view interface) {
   std::optional<std::string> input;
   std::optional<std::string> output;
-  io_port_get_names(ioport, &input, &output);
+  io_port_get_names(port, &input, &output);
   const bool of_input = contains(interface, "Input") ||
-                        (!contains(interface, "Output") && io_port_direction_input(ioport));
+                        (!contains(interface, "Output") && io_port_direction_input(port));
   return new_text((of_input ? input : output).value_or("<NULL>"));
 }
 
-GVariant *get_nbr_of_ports(const IOPort * /*ioport*/, std::string_view /*interface*/) {
+GVariant *get_nbr_of_ports(const IOPort * /*port*/, std::string_view /*interface*/) {
   return new_count(port_registry_count_inputs() + port_registry_count_outputs());
 }
 
-GVariant *get_trig(const IOPort *ioport, std::string_view /*interface*/) {
-  return new_text(activelow_word(io_port_get_activelow(ioport, true)));
+GVariant *get_trig(const IOPort *port, std::string_view /*interface*/) {
+  return new_text(activelow_word(io_port_get_activelow(port, true)));
 }
 
-GVariant *get_active(const IOPort *ioport, std::string_view /*interface*/) {
-  return new_text(activelow_word(io_port_get_activelow(ioport, false)));
+GVariant *get_active(const IOPort *port, std::string_view /*interface*/) {
+  return new_text(activelow_word(io_port_get_activelow(port, false)));
 }
 
-GVariant *get_configurable(const IOPort *ioport, std::string_view /*interface*/) {
-  return io_port_is_ioport(ioport)
-             ? g_variant_new_boolean(io_port_get_type(ioport) == PORT_CONFIGURABLE)
+GVariant *get_configurable(const IOPort *port, std::string_view /*interface*/) {
+  return io_port_is_ioport(port)
+             ? g_variant_new_boolean(io_port_get_type(port) == PORT_CONFIGURABLE)
              : nullptr;
 }
 
-GVariant *get_direction(const IOPort *ioport, std::string_view /*interface*/) {
-  return io_port_is_ioport(ioport) ? new_text(direction_word(io_port_direction_input(ioport)))
-                                   : nullptr;
+GVariant *get_direction(const IOPort *port, std::string_view /*interface*/) {
+  return io_port_is_ioport(port) ? new_text(direction_word(io_port_direction_input(port)))
+                                 : nullptr;
 }
 
-GVariant *get_button(const IOPort *ioport, std::string_view /*interface*/) {
-  return new_text(button_word(io_port_get_button(ioport)));
+GVariant *get_button(const IOPort *port, std::string_view /*interface*/) {
+  return new_text(button_word(io_port_get_button(port)));
 }
 
-GVariant *get_pulse_time(const IOPort *ioport, std::string_view /*interface*/) {
-  return new_count(io_port_get_pulse_time(ioport));
+GVariant *get_pulse_time(const IOPort *port, std::string_view /*interface*/) {
+  return new_count(io_port_get_pulse_time(port));
 }
 
-GVariant *get_mode(const IOPort *ioport, std::string_view /*interface*/) {
-  return new_text(mode_word(io_port_get_mode(ioport)));
+GVariant *get_mode(const IOPort *port, std::string_view /*interface*/) {
+  return new_text(mode_word(io_port_get_mode(port)));
 }
 
-GVariant *get_delay_time(const IOPort *ioport, std::string_view /*interface*/) {
-  return g_variant_new_int32(io_port_get_delay_time(ioport));
+GVariant *get_delay_time(const IOPort *port, std::string_view /*interface*/) {
+  return g_variant_new_int32(io_port_get_delay_time(port));
 }
 
 // --- Writing ---
@@ -105,7 +105,7 @@ GVariant *get_delay_time(const IOPort *ioport, std::string_view /*interface*/) {
 enum class Outcome { kRefused, kUnchanged, kStore };
 
 struct Request {
-  IOPort *ioport;
+  IOPort *port;
   std::string_view interface;
   const char *property;
   GVariant *value;
@@ -147,9 +147,9 @@ Outcome set_name(const Request &request) {
     return refuse_value(request);
   }
   if (contains(request.interface, "Input")) {
-    io_port_set_input_name(request.ioport, *name);
+    io_port_set_input_name(request.port, *name);
   } else if (contains(request.interface, "Output")) {
-    io_port_set_output_name(request.ioport, *name);
+    io_port_set_output_name(request.port, *name);
   } else {
     return refuse_value(request);
   }
@@ -162,7 +162,7 @@ std::optional<bool> activelow_of(const Request &request) {
 }
 
 bool set_activelow(const Request &request, bool activelow) {
-  return io_port_set_activelow(request.ioport, activelow, request.interface.ends_with("Input"));
+  return io_port_set_activelow(request.port, activelow, request.interface.ends_with("Input"));
 }
 
 Outcome set_trig(const Request &request) {
@@ -184,13 +184,13 @@ Outcome set_active(const Request &request) {
 }
 
 Outcome change_direction(const Request &request, bool input) {
-  if (io_port_direction_input(request.ioport) == input) {
+  if (io_port_direction_input(request.port) == input) {
     return Outcome::kUnchanged;
   }
-  if (io_port_get_type(request.ioport) != PORT_CONFIGURABLE) {
+  if (io_port_get_type(request.port) != PORT_CONFIGURABLE) {
     return refuse(request, "Port Direction is not settable");
   }
-  if (!io_port_set_direction(request.ioport, input)) {
+  if (!io_port_set_direction(request.port, input)) {
     return refuse(request, "Setting Direction failed");
   }
   legacy_announce_counts(legacy_announcer());
@@ -214,7 +214,7 @@ Outcome set_button(const Request &request) {
     return refuse_value(request);
   }
   if (const auto button = parse_button(*word)) {
-    io_port_set_button(request.ioport, *button);
+    io_port_set_button(request.port, *button);
   }
   return Outcome::kStore;
 }
@@ -224,7 +224,7 @@ Outcome set_pulse_time(const Request &request) {
   if (!time) {
     return refuse_value(request);
   }
-  io_port_set_pulse_time(request.ioport, static_cast<std::uint32_t>(*time));
+  io_port_set_pulse_time(request.port, static_cast<std::uint32_t>(*time));
   return Outcome::kStore;
 }
 
@@ -233,7 +233,7 @@ Outcome set_delay_time(const Request &request) {
   if (!time) {
     return refuse_value(request);
   }
-  io_port_set_delay_time(request.ioport, *time);
+  io_port_set_delay_time(request.port, *time);
   return Outcome::kStore;
 }
 
@@ -243,13 +243,13 @@ Outcome set_mode(const Request &request) {
   if (!mode) {
     return refuse_value(request);
   }
-  io_port_set_mode(request.ioport, *mode);
+  io_port_set_mode(request.port, *mode);
   return Outcome::kStore;
 }
 
 struct Property {
   std::string_view name;
-  GVariant *(*get)(const IOPort *ioport, std::string_view interface);
+  GVariant *(*get)(const IOPort *port, std::string_view interface);
   Outcome (*set)(const Request &request);  // null: can't be written
 };
 
@@ -290,12 +290,12 @@ GVariant *iocontrol_conf_legacy_dbus_get_property(GDBusConnection * /*connection
   if (name == "NbrOfOutputs") {
     return new_count(port_registry_count_outputs());
   }
-  const IOPortRef ioport = find_port(object_path, error);
-  if (!ioport) {
+  const IOPortRef port = find_port(object_path, error);
+  if (!port) {
     return nullptr;
   }
   const Property *property = find_property(name);
-  GVariant *value = property ? property->get(ioport.get(), interface_name) : nullptr;
+  GVariant *value = property ? property->get(port.get(), interface_name) : nullptr;
   if (!value) {
     g_set_error(error, G_DBUS_ERROR, G_DBUS_ERROR_INVALID_ARGS, "The port has no value for '%s'",
                 property_name);
@@ -305,12 +305,12 @@ GVariant *iocontrol_conf_legacy_dbus_get_property(GDBusConnection * /*connection
 
 LegacyWrite legacy_write_property(const LegacyValue &written, std::function<void()> stored,
                                   GError **error) {
-  const std::shared_ptr<IOPort> ioport = find_port(written.object_path, error);
-  if (!ioport) {
+  const std::shared_ptr<IOPort> port = find_port(written.object_path, error);
+  if (!port) {
     return LegacyWrite::kRefused;
   }
-  const Request request = {ioport.get(), written.interface_name, written.property_name,
-                           written.value, error};
+  const Request request = {port.get(), written.interface_name, written.property_name, written.value,
+                           error};
   const Property *property = find_property(written.property_name);
   const Outcome outcome = property && property->set
                               ? property->set(request)
@@ -318,8 +318,8 @@ LegacyWrite legacy_write_property(const LegacyValue &written, std::function<void
                                                     written.property_name + "'");
   if (outcome == Outcome::kStore) {
     // Whoever is answered finds the setting stored, after what the port waits for has answered.
-    io_port_when_settled(ioport.get(), [ioport, stored = std::move(stored)] {
-      param_request_save(ioport.get(), kSettingsFile, stored);
+    io_port_when_settled(port.get(), [port, stored = std::move(stored)] {
+      param_request_save(port.get(), kSettingsFile, stored);
     });
     return LegacyWrite::kBeingStored;
   }

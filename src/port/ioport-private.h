@@ -95,33 +95,33 @@ struct IOPort {
 
 // Ends a running sequence and returns holding the port's lock, so that no other can begin to drive
 // the port until the lock is given up.
-[[nodiscard]] std::unique_lock<std::mutex> io_port_stop_sequence_and_lock(IOPort *ioport);
+[[nodiscard]] std::unique_lock<std::mutex> io_port_stop_sequence_and_lock(IOPort *port);
 
 // Waits until what was begun in the background for the port so far has ended. False: the port's
 // sequence was cancelled meanwhile. Action threads, without any lock.
-bool io_port_settle_or_cancel(IOPort *ioport);
+bool io_port_settle_or_cancel(IOPort *port);
 // Wakes who waits there, once `cancel_sequence` is set.
-void io_port_cancel_wait(IOPort *ioport);
+void io_port_cancel_wait(IOPort *port);
 
 // Whether the backend can be asked: not while it has given up its record.
-inline bool io_port_backend_serves(const IOPort *ioport) {
-  return ioport->functions && !ioport->backend_released;
+inline bool io_port_backend_serves(const IOPort *port) {
+  return port->functions && !port->backend_released;
 }
 
 // The raw level that the backend reads, and the one that it is to write.
-std::uint32_t io_port_read_level(IOPort *ioport);
-void io_port_write_level(IOPort *ioport, std::int32_t level);
+std::uint32_t io_port_read_level(IOPort *port);
+void io_port_write_level(IOPort *port, std::int32_t level);
 
 // Frees the port, whoever may still hold references.
-void io_port_destroy(IOPort *ioport);
+void io_port_destroy(IOPort *port);
 
 // Sends those events of the port that apply to its role, while its events are enabled.
-void io_port_fire_events(IOPort *ioport, std::int32_t state);
+void io_port_fire_events(IOPort *port, std::int32_t state);
 // The same where the state of the line is known apart: events for supervised inputs are told that.
-void io_port_fire_line_events(IOPort *ioport, std::int32_t state, std::int32_t line);
-void io_port_undeclare_events(IOPort *ioport);
+void io_port_fire_line_events(IOPort *port, std::int32_t state, std::int32_t line);
+void io_port_undeclare_events(IOPort *port);
 // As io_port_redeclare_events. The caller holds the port's lock.
-void io_port_redeclare_events_locked(IOPort *ioport);
+void io_port_redeclare_events_locked(IOPort *port);
 // Declares the events that apply to the port's role, anew when it has changed, and withdraws the
 // others.
-void io_port_declare_events_for_role(IOPort *ioport, bool role_changed);
+void io_port_declare_events_for_role(IOPort *port, bool role_changed);

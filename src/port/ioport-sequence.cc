@@ -7,6 +7,7 @@
 
 #include <algorithm>
 
+#include "base/assert.h"
 #include "base/glib-ptr.h"
 #include "base/log.h"
 #include "port/ioport-private.h"
@@ -44,22 +45,22 @@ void thread_ends() {
   threads_gone.notify_all();
 }
 
-bool can_run(const IOPort *ioport, const ActionSequence &sequence) {
-  const bool may_drive = !io_port_input(ioport) && ioport->backend != BACKEND_VIRTUAL;
-  return !sequence.steps.empty() && (sequence.is_virtual || may_drive) && ioport->set_up;
+bool can_run(const IOPort *port, const ActionSequence &sequence) {
+  const bool may_drive = !io_port_input(port) && port->backend != BACKEND_VIRTUAL;
+  return !sequence.steps.empty() && (sequence.is_virtual || may_drive) && port->set_up;
 }
 
 // What ends the waits of the sequence that may begin now. Null: one runs already.
-GObjectPtr<GCancellable> claim(IOPort *ioport) {
-  const std::lock_guard lock(ioport->sequence_lock);
-  if (ioport->sequence_running) {
+GObjectPtr<GCancellable> claim(IOPort *port) {
+  const std::lock_guard lock(port->sequence_lock);
+  if (port->sequence_running) {
     return nullptr;
   }
-  ioport->sequence_running = true;
-  ioport->cancel_sequence = false;
-  ioport->sequence_cancelled.reset(g_cancellable_new());
+  port->sequence_running = true;
+  port->cancel_sequence = false;
+  port->sequence_cancelled.reset(g_cancellable_new());
   return GObjectPtr<GCancellable>(
-      static_cast<GCancellable *>(g_object_ref(ioport->sequence_cancelled.get())));
+      static_cast<GCancellable *>(g_object_ref(port->sequence_cancelled.get())));
 }
 
 // The product wraps in 32 bits: times above 2,147,483 ms have always behaved that way.
@@ -69,33 +70,33 @@ std::int64_t deadline_after(std::int32_t time_ms) {
 }
 
 // Holds the step's state until then. False: the sequence is cancelled.
-bool hold(IOPort *ioport, std::int64_t deadline) {
-  std::unique_lock lock(ioport->sequence_lock);
-  while (!ioport->cancel_sequence && g_get_monotonic_time() < deadline) {
-    ioport->sequence_cond.wait_until(lock, deadline);
+bool hold(IOPort *port, std::int64_t deadline) {
+  std::unique_lock lock(port->sequence_lock);
+  while (!port->cancel_sequence && g_get_monotonic_time() < deadline) {
+    port->sequence_cond.wait_until(lock, deadline);
   }
-  return !ioport->cancel_sequence;
+  return !port->cancel_sequence;
 }
 
-void take_step(IOPort *ioport, bool is_virtual, bool state) {
-  const std::lock_guard lock(ioport->lock);
+void take_step(IOPort *port, bool is_virtual, bool state) {
+  const std::lock_guard lock(port->lock);
   if (is_virtual) {
-    io_port_set_virtual(ioport, state);
+    io_port_set_virtual(port, state);
   } else {
-    io_port_set_state_internal(ioport, state);
+    io_port_set_state_internal(port, state);
   }
 }
 
-void release(IOPort *ioport) {
-  const std::lock_guard lock(ioport->sequence_lock);
-  ioport->cancel_sequence = false;
-  ioport->sequence_running = false;
-  ioport->sequence_done_cond.notify_all();
+void release(IOPort *port) {
+  const std::lock_guard lock(port->sequence_lock);
+  port->cancel_sequence = false;
+  port->sequence_running = false;
+  port->sequence_done_cond.notify_all();
 }
 
-void announce_end(IOPort *ioport) {
+void announce_end(IOPort *port) {
   if (const auto done = port_listener().action_sequence_done) {
-    done(ioport->number);
+    done(port->number);
   }
 }
 
@@ -106,13 +107,13 @@ void wait_until_sent(GCancellable *cancelled, std::int64_t step_deadline) {
 }
 
 void run_steps(const ActionJob &job) {
-  IOPort *ioport = job.port.get();
+  IOPort *port = job.port.get();
   int steps_ahead = 0;
   for (const auto &step : job.sequence.steps) {
-    take_step(ioport, job.sequence.is_virtual, step.state);
+    take_step(port, job.sequence.is_virtual, step.state);
     // A step's time begins when the port has the state. That is waited for without the lock, so
     // that nobody else waits along.
-    if (!io_port_settle_or_cancel(ioport)) {
+    if (!io_port_settle_or_cancel(port)) {
       return;
     }
     const std::int64_t deadline = deadline_after(step.time_ms);
@@ -120,7 +121,7 @@ void run_steps(const ActionJob &job) {
       wait_until_sent(job.cancelled.get(), deadline);
       steps_ahead = 0;
     }
-    if (!hold(ioport, deadline)) {
+    if (!hold(port, deadline)) {
       return;
     }
   }
@@ -153,17 +154,17 @@ gpointer run_sequence(gpointer data) {
   return nullptr;
 }
 
-bool start_thread(IOPort *ioport, GObjectPtr<GCancellable> cancelled, ActionSequence sequence) {
-  io_port_ref(ioport);
+bool start_thread(IOPort *port, GObjectPtr<GCancellable> cancelled, ActionSequence sequence) {
+  io_port_ref(port);
   auto job = std::make_unique<ActionJob>(
-      ActionJob{IOPortRef(ioport), std::move(cancelled), std::move(sequence)});
+      ActionJob{IOPortRef(port), std::move(cancelled), std::move(sequence)});
   thread_begins();
   Error error;
   GThread *thread = g_thread_try_new(kThreadName, run_sequence, job.get(), error.out());
   if (!thread) {
     log_warning("Could not start action thread: %s", error.message());
     thread_ends();
-    release(ioport);
+    release(port);
     return false;
   }
   (void)job.release();  // the thread owns it
@@ -173,38 +174,38 @@ bool start_thread(IOPort *ioport, GObjectPtr<GCancellable> cancelled, ActionSequ
 
 }  // namespace
 
-bool io_port_run_action_sequence(IOPort *ioport, ActionSequence sequence) {
-  g_assert(ioport);
-  auto cancelled = can_run(ioport, sequence) ? claim(ioport) : nullptr;
+bool io_port_run_action_sequence(IOPort *port, ActionSequence sequence) {
+  assert_port(port);
+  auto cancelled = can_run(port, sequence) ? claim(port) : nullptr;
   if (!cancelled) {
     log_warning("Set action seq on incorrect port");
     return false;
   }
-  return start_thread(ioport, std::move(cancelled), std::move(sequence));
+  return start_thread(port, std::move(cancelled), std::move(sequence));
 }
 
-bool io_port_is_busy(IOPort *ioport) {
+bool io_port_is_busy(IOPort *port) {
   {
-    const std::lock_guard lock(ioport->sequence_lock);
-    if (ioport->sequence_running) {
+    const std::lock_guard lock(port->sequence_lock);
+    if (port->sequence_running) {
       return true;
     }
   }
-  const std::unique_lock lock(ioport->lock, std::try_to_lock);
+  const std::unique_lock lock(port->lock, std::try_to_lock);
   return !lock.owns_lock();
 }
 
-std::unique_lock<std::mutex> io_port_stop_sequence_and_lock(IOPort *ioport) {
-  std::unique_lock sequence(ioport->sequence_lock);
-  while (ioport->sequence_running) {
+std::unique_lock<std::mutex> io_port_stop_sequence_and_lock(IOPort *port) {
+  std::unique_lock sequence(port->sequence_lock);
+  while (port->sequence_running) {
     // Asked for anew at each wake-up: another sequence may have begun since the last one ended.
-    ioport->cancel_sequence = true;
-    ioport->sequence_cond.notify_all();
-    g_cancellable_cancel(ioport->sequence_cancelled.get());
-    io_port_cancel_wait(ioport);
-    ioport->sequence_done_cond.wait(sequence);
+    port->cancel_sequence = true;
+    port->sequence_cond.notify_all();
+    g_cancellable_cancel(port->sequence_cancelled.get());
+    io_port_cancel_wait(port);
+    port->sequence_done_cond.wait(sequence);
   }
-  return std::unique_lock(ioport->lock);
+  return std::unique_lock(port->lock);
 }
 
 void io_port_wait_for_action_threads() {

@@ -8,8 +8,8 @@ namespace {
 
 constexpr std::uint32_t kUnknownLevel = 2;  // and everything above
 
-bool is_driven_output(const IOPort *ioport) {
-  return !io_port_input(ioport) && ioport->backend != BACKEND_VIRTUAL && ioport->set_up;
+bool is_driven_output(const IOPort *port) {
+  return !io_port_input(port) && port->backend != BACKEND_VIRTUAL && port->set_up;
 }
 
 }  // namespace
@@ -35,80 +35,80 @@ bool io_port_supervised_input(const IOPort *port) {
   return io_port_input(port) && port->supervised;
 }
 
-bool io_port_is_supervised(const IOPort *ioport) {
-  return ioport->supervised;
+bool io_port_is_supervised(const IOPort *port) {
+  return port->supervised;
 }
 
-bool io_port_get_activelow(const IOPort *ioport, bool input) {
-  return input ? ioport->activelow_input : ioport->activelow_output;
+bool io_port_get_activelow(const IOPort *port, bool input) {
+  return input ? port->activelow_input : port->activelow_output;
 }
 
-std::uint32_t io_port_read_level(IOPort *ioport) {
-  return io_port_backend_serves(ioport) && ioport->functions->get_state
-             ? ioport->functions->get_state(ioport)
+std::uint32_t io_port_read_level(IOPort *port) {
+  return io_port_backend_serves(port) && port->functions->get_state
+             ? port->functions->get_state(port)
              : 0;
 }
 
-void io_port_write_level(IOPort *ioport, std::int32_t level) {
-  if (io_port_backend_serves(ioport) && ioport->functions->set_state) {
-    ioport->functions->set_state(ioport, level);
+void io_port_write_level(IOPort *port, std::int32_t level) {
+  if (io_port_backend_serves(port) && port->functions->set_state) {
+    port->functions->set_state(port, level);
   }
 }
 
-bool io_port_get_state(IOPort *ioport) {
-  g_assert(ioport);
-  if (!ioport->set_up) {
+bool io_port_get_state(IOPort *port) {
+  assert_port(port);
+  if (!port->set_up) {
     return false;
   }
-  const std::uint32_t raw = io_port_read_level(ioport);
+  const std::uint32_t raw = io_port_read_level(port);
   if (raw >= kUnknownLevel) {
     return false;
   }
-  return (raw != 0) != io_port_get_activelow(ioport, io_port_input(ioport));
+  return (raw != 0) != io_port_get_activelow(port, io_port_input(port));
 }
 
-bool io_port_set_state(IOPort *ioport, bool state) {
-  g_assert(ioport);
-  if (!is_driven_output(ioport)) {
+bool io_port_set_state(IOPort *port, bool state) {
+  assert_port(port);
+  if (!is_driven_output(port)) {
     log_warning("Set state on incorrect port");
     return false;
   }
-  const std::lock_guard lock(ioport->lock);
-  io_port_set_state_internal(ioport, state);
+  const std::lock_guard lock(port->lock);
+  io_port_set_state_internal(port, state);
   return true;
 }
 
-void io_port_set_state_internal(IOPort *ioport, bool state) {
-  g_return_if_fail(ioport != NULL);
-  const bool old = io_port_get_state(ioport);
-  io_port_write_level(ioport, state != ioport->activelow_output);
-  const bool now = io_port_get_state(ioport);
+void io_port_set_state_internal(IOPort *port, bool state) {
+  return_if_no_port(port);
+  const bool old = io_port_get_state(port);
+  io_port_write_level(port, state != port->activelow_output);
+  const bool now = io_port_get_state(port);
   if (now != old) {
-    io_port_report_state(ioport, now);
+    io_port_report_state(port, now);
   }
 }
 
-bool io_port_set_virtual(IOPort *ioport, bool state) {
-  if (!ioport->events_enabled) {
+bool io_port_set_virtual(IOPort *port, bool state) {
+  if (!port->events_enabled) {
     return true;
   }
-  if (ioport->backend == BACKEND_VIRTUAL && ioport->type == PORT_OUTPUT) {
-    io_port_write_level(ioport, state);
+  if (port->backend == BACKEND_VIRTUAL && port->type == PORT_OUTPUT) {
+    io_port_write_level(port, state);
   }
-  io_port_fire_events(ioport, state);
-  io_port_send_signal(ioport, true, state);
+  io_port_fire_events(port, state);
+  io_port_send_signal(port, true, state);
   return true;
 }
 
-void io_port_report_state(IOPort *ioport, std::int32_t state) {
-  io_port_fire_events(ioport, state);
-  io_port_send_signal(ioport, false, state != 0);
+void io_port_report_state(IOPort *port, std::int32_t state) {
+  io_port_fire_events(port, state);
+  io_port_send_signal(port, false, state != 0);
 }
 
-void io_port_report_line(IOPort *ioport, SupervisedRangeState line) {
-  const bool state = io_port_get_state(ioport);
-  io_port_fire_line_events(ioport, state, static_cast<std::int32_t>(line));
-  io_port_send_signal(ioport, false, state);
+void io_port_report_line(IOPort *port, SupervisedRangeState line) {
+  const bool state = io_port_get_state(port);
+  io_port_fire_line_events(port, state, static_cast<std::int32_t>(line));
+  io_port_send_signal(port, false, state);
 }
 
 void io_port_send_signal(IOPort *port, bool virtual_change, bool state) {

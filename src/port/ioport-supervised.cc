@@ -53,14 +53,14 @@ bool io_port_set_supervised(IOPort *port, bool supervised) {
   return true;
 }
 
-SupervisedRanges io_port_range_list(const IOPort *ioport) {
-  const std::lock_guard lock(ioport->ranges_lock);
-  return ioport->supervised_ranges;
+SupervisedRanges io_port_range_list(const IOPort *port) {
+  const std::lock_guard lock(port->ranges_lock);
+  return port->supervised_ranges;
 }
 
-void io_port_store_range_list(IOPort *ioport, SupervisedRanges ranges) {
-  const std::lock_guard lock(ioport->ranges_lock);
-  ioport->supervised_ranges.swap(ranges);
+void io_port_store_range_list(IOPort *port, SupervisedRanges ranges) {
+  const std::lock_guard lock(port->ranges_lock);
+  port->supervised_ranges.swap(ranges);
 }
 
 bool io_port_get_supervised_ranges(IOPort *port, SupervisedRanges *ranges) {
@@ -79,7 +79,7 @@ bool io_port_set_supervised_ranges(IOPort *port, SupervisedRanges ranges, GError
          port->functions->set_supervised_ranges(port, std::move(ranges), error);
 }
 
-bool io_port_set_supervised_range(IOPort *ioport, const char *state_word, std::uint32_t lower,
+bool io_port_set_supervised_range(IOPort *port, const char *state_word, std::uint32_t lower,
                                   std::uint32_t upper, GError **error) {
   if (!valid_limits(lower, upper)) {
     g_set_error_literal(error, io_supervised_error_quark(), IO_SUPERVISED_ERROR_BAD_RANGE,
@@ -93,7 +93,7 @@ bool io_port_set_supervised_range(IOPort *ioport, const char *state_word, std::u
     return false;
   }
   SupervisedRanges ranges;
-  if (!io_port_get_supervised_ranges(ioport, &ranges)) {
+  if (!io_port_get_supervised_ranges(port, &ranges)) {
     g_set_error_literal(error, io_supervised_error_quark(), IO_SUPERVISED_ERROR_GENERIC,
                         "Failed to get ranges from port.");
     return false;
@@ -104,7 +104,7 @@ bool io_port_set_supervised_range(IOPort *ioport, const char *state_word, std::u
     ranges.erase(same);
   }
   ranges.push_back({state, upper, lower});
-  return io_port_set_supervised_ranges(ioport, std::move(ranges), error);
+  return io_port_set_supervised_ranges(port, std::move(ranges), error);
 }
 
 bool io_port_get_supervised_readout(IOPort *port, SupervisedRangeState *state, std::uint32_t *level,
@@ -125,15 +125,15 @@ bool io_port_get_supervised_readout(IOPort *port, SupervisedRangeState *state, s
   return port->functions->get_supervised_readout(port, state, level, error);
 }
 
-SupervisedRangeState io_port_get_supervised_state(IOPort *ioport) {
-  g_assert(ioport);
-  if (!ioport->set_up || !io_port_is_supervisable(ioport)) {
+SupervisedRangeState io_port_get_supervised_state(IOPort *port) {
+  assert_port(port);
+  if (!port->set_up || !io_port_is_supervisable(port)) {
     return SUPERVISED_STATE_OPEN;
   }
   SupervisedRangeState state = SUPERVISED_STATE_UNDEFINED;
   std::uint32_t level = 0;
   Error error;
-  if (!io_port_get_supervised_readout(ioport, &state, &level, error.out())) {
+  if (!io_port_get_supervised_readout(port, &state, &level, error.out())) {
     log_warning("Failed to read supervised state: %s.", error.message());
     return SUPERVISED_STATE_UNDEFINED;
   }

@@ -24,40 +24,40 @@ const PortFunctions *functions_of(BackendKind kind) {
   return found == table.end() ? nullptr : found->functions;
 }
 
-void make_record(IOPort *ioport) {
-  if (ioport->functions && ioport->functions->make_record && !ioport->backend_data) {
-    ioport->backend_data = ioport->functions->make_record();
+void make_record(IOPort *port) {
+  if (port->functions && port->functions->make_record && !port->backend_data) {
+    port->backend_data = port->functions->make_record();
   }
 }
 
-void destroy_record(IOPort *ioport) {
-  if (io_port_backend_serves(ioport) && ioport->functions->drop) {
-    ioport->functions->drop(ioport);
+void destroy_record(IOPort *port) {
+  if (io_port_backend_serves(port) && port->functions->drop) {
+    port->functions->drop(port);
   }
-  ioport->backend_data.reset();
+  port->backend_data.reset();
 }
 
-void apply_backend_property(IOPort *ioport, const BackendProperty &property) {
-  if (ioport->functions->set_property) {
-    ioport->functions->set_property(ioport, property.section.c_str(), property.key.c_str(),
-                                    property.value.c_str());
+void apply_backend_property(IOPort *port, const BackendProperty &property) {
+  if (port->functions->set_property) {
+    port->functions->set_property(port, property.section.c_str(), property.key.c_str(),
+                                  property.value.c_str());
   }
 }
 
 // Some backends give up their private record when they are dropped, and with it what the hardware
 // description told them.
-void rebuild_released_backend(IOPort *ioport) {
-  if (!ioport->backend_released) {
+void rebuild_released_backend(IOPort *port) {
+  if (!port->backend_released) {
     return;
   }
-  ioport->backend_released = false;
-  make_record(ioport);
+  port->backend_released = false;
+  make_record(port);
   // The description's ranges are only the first ones; the user may have set others since.
-  SupervisedRanges ranges = io_port_range_list(ioport);
-  for (const auto &property : ioport->backend_properties) {
-    apply_backend_property(ioport, property);
+  SupervisedRanges ranges = io_port_range_list(port);
+  for (const auto &property : port->backend_properties) {
+    apply_backend_property(port, property);
   }
-  io_port_store_range_list(ioport, std::move(ranges));
+  io_port_store_range_list(port, std::move(ranges));
 }
 
 }  // namespace
@@ -71,23 +71,23 @@ IOPort *io_port_new() {
   return new IOPort;
 }
 
-void io_port_ref(IOPort *ioport) {
-  if (ioport) {
-    ioport->refcount.fetch_add(1, std::memory_order_relaxed);
+void io_port_ref(IOPort *port) {
+  if (port) {
+    port->refcount.fetch_add(1, std::memory_order_relaxed);
   }
 }
 
-void io_port_unref(IOPort *ioport) {
-  if (ioport && ioport->refcount.fetch_sub(1, std::memory_order_acq_rel) == 1) {
-    io_port_destroy(ioport);
+void io_port_unref(IOPort *port) {
+  if (port && port->refcount.fetch_sub(1, std::memory_order_acq_rel) == 1) {
+    io_port_destroy(port);
   }
 }
 
-void io_port_destroy(IOPort *ioport) {
-  io_port_stop_sequence_and_lock(ioport).unlock();
-  io_port_undeclare_events(ioport);
-  destroy_record(ioport);
-  delete ioport;
+void io_port_destroy(IOPort *port) {
+  io_port_stop_sequence_and_lock(port).unlock();
+  io_port_undeclare_events(port);
+  destroy_record(port);
+  delete port;
 }
 
 void io_port_register_backend(const Backend &backend) {
@@ -103,39 +103,39 @@ std::optional<BackendKind> io_port_backend_kind(std::string_view word) {
   return found == table.end() ? std::nullopt : std::optional(found->kind);
 }
 
-void io_port_set_backend(IOPort *ioport, BackendKind kind) {
-  if (ioport->backend != kind) {
-    destroy_record(ioport);  // the next backend must not find the record of another
-    ioport->backend_properties.clear();
+void io_port_set_backend(IOPort *port, BackendKind kind) {
+  if (port->backend != kind) {
+    destroy_record(port);  // the next backend must not find the record of another
+    port->backend_properties.clear();
   }
-  ioport->backend = kind;
-  ioport->functions = functions_of(kind);
-  ioport->backend_released = false;
-  make_record(ioport);
+  port->backend = kind;
+  port->functions = functions_of(kind);
+  port->backend_released = false;
+  make_record(port);
 }
 
-BackendKind io_port_get_backend(const IOPort *ioport) {
-  return ioport->backend;
+BackendKind io_port_get_backend(const IOPort *port) {
+  return port->backend;
 }
 
-bool io_port_has_backend(const IOPort *ioport) {
-  return ioport->functions != nullptr;
+bool io_port_has_backend(const IOPort *port) {
+  return port->functions != nullptr;
 }
 
-void io_port_set_backend_property(IOPort *ioport, const char *section, const char *key,
+void io_port_set_backend_property(IOPort *port, const char *section, const char *key,
                                   const char *value) {
-  if (!ioport->functions) {
-    log_warning("Port %s has no backend to set %s %s of", io_port_describe(ioport), section, key);
+  if (!port->functions) {
+    log_warning("Port %s has no backend to set %s %s of", io_port_describe(port), section, key);
     return;
   }
-  ioport->backend_properties.push_back({section, key, value});
-  if (io_port_backend_serves(ioport)) {
-    apply_backend_property(ioport, ioport->backend_properties.back());
+  port->backend_properties.push_back({section, key, value});
+  if (io_port_backend_serves(port)) {
+    apply_backend_property(port, port->backend_properties.back());
   }
 }
 
-PortBackendData *io_port_backend_data(const IOPort *ioport) {
-  return ioport->backend_data.get();
+PortBackendData *io_port_backend_data(const IOPort *port) {
+  return port->backend_data.get();
 }
 
 bool io_port_begin_setup(IOPort *port) {
@@ -163,155 +163,155 @@ bool io_port_setup(IOPort *port) {
   return port->set_up;
 }
 
-bool io_port_is_set_up(const IOPort *ioport) {
-  return ioport->set_up;
+bool io_port_is_set_up(const IOPort *port) {
+  return port->set_up;
 }
 
-void io_port_finish_setup(IOPort *ioport) {
-  ioport->set_up = true;
-  ioport->idle_logged = false;
+void io_port_finish_setup(IOPort *port) {
+  port->set_up = true;
+  port->idle_logged = false;
 }
 
-void io_port_note_fault(IOPort *ioport, const char *format, ...) {
-  if (ioport->set_up) {
+void io_port_note_fault(IOPort *port, const char *format, ...) {
+  if (port->set_up) {
     return;
   }
   va_list arguments;
   va_start(arguments, format);
   const GCharPtr text(g_strdup_vprintf(format, arguments));
   va_end(arguments);
-  if (!ioport->fault.empty()) {
-    ioport->fault += "; ";
+  if (!port->fault.empty()) {
+    port->fault += "; ";
   }
-  ioport->fault += text.get();
+  port->fault += text.get();
 }
 
-std::string io_port_fault(const IOPort *ioport) {
-  return ioport->fault.empty() && !ioport->set_up ? "its set-up failed" : ioport->fault;
+std::string io_port_fault(const IOPort *port) {
+  return port->fault.empty() && !port->set_up ? "its set-up failed" : port->fault;
 }
 
-bool io_port_in_service(const IOPort *ioport) {
-  return ioport->set_up && ioport->fault.empty();
+bool io_port_in_service(const IOPort *port) {
+  return port->set_up && port->fault.empty();
 }
 
-void io_port_drop(IOPort *ioport) {
-  if (!ioport->functions) {
+void io_port_drop(IOPort *port) {
+  if (!port->functions) {
     return;
   }
-  const auto lock = io_port_stop_sequence_and_lock(ioport);
-  ioport->set_up = false;
+  const auto lock = io_port_stop_sequence_and_lock(port);
+  port->set_up = false;
   // What they last said would stay listed: a siren that is gone would be on for ever.
-  io_port_undeclare_events(ioport);
-  if (ioport->functions->drop) {
-    ioport->functions->drop(ioport);
+  io_port_undeclare_events(port);
+  if (port->functions->drop) {
+    port->functions->drop(port);
   } else {
-    destroy_record(ioport);
-    ioport->backend_released = true;
+    destroy_record(port);
+    port->backend_released = true;
   }
 }
 
-PortType io_port_get_type(const IOPort *ioport) {
-  return ioport->type;
+PortType io_port_get_type(const IOPort *port) {
+  return port->type;
 }
 
-void io_port_set_type(IOPort *ioport, PortType type) {
-  ioport->type = type;
+void io_port_set_type(IOPort *port, PortType type) {
+  port->type = type;
 }
 
-const std::optional<std::string> &io_port_get_id(const IOPort *ioport) {
-  return ioport->id;
+const std::optional<std::string> &io_port_get_id(const IOPort *port) {
+  return port->id;
 }
 
-void io_port_set_id(IOPort *ioport, std::string id) {
-  ioport->id = std::move(id);
+void io_port_set_id(IOPort *port, std::string id) {
+  port->id = std::move(id);
 }
 
-const char *io_port_describe(const IOPort *ioport) {
-  return ioport->id ? ioport->id->c_str() : "(without name)";
+const char *io_port_describe(const IOPort *port) {
+  return port->id ? port->id->c_str() : "(without name)";
 }
 
-int io_port_get_number(const IOPort *ioport) {
-  return ioport->number;
+int io_port_get_number(const IOPort *port) {
+  return port->number;
 }
 
-void io_port_set_number(IOPort *ioport, int number) {
-  ioport->number = number;
+void io_port_set_number(IOPort *port, int number) {
+  port->number = number;
 }
 
-bool io_port_is_optional(const IOPort *ioport) {
-  return ioport->optional;
+bool io_port_is_optional(const IOPort *port) {
+  return port->optional;
 }
 
-void io_port_set_optional(IOPort *ioport, bool optional) {
-  ioport->optional = optional;
+void io_port_set_optional(IOPort *port, bool optional) {
+  port->optional = optional;
 }
 
-void io_port_set_flag(IOPort *ioport, const std::string &name, const char *text) {
-  ioport->properties[name] = g_ascii_strcasecmp(text, "true") == 0;
+void io_port_set_flag(IOPort *port, const std::string &name, const char *text) {
+  port->properties[name] = g_ascii_strcasecmp(text, "true") == 0;
 }
 
-bool io_port_get_flag(const IOPort *ioport, const char *name) {
-  return ioport->functions && io_port_lookup_flag(ioport, name).value_or(false);
+bool io_port_get_flag(const IOPort *port, const char *name) {
+  return port->functions && io_port_lookup_flag(port, name).value_or(false);
 }
 
-std::optional<bool> io_port_lookup_flag(const IOPort *ioport, const char *name) {
-  const auto entry = ioport->properties.find(name);
-  if (entry == ioport->properties.end()) {
+std::optional<bool> io_port_lookup_flag(const IOPort *port, const char *name) {
+  const auto entry = port->properties.find(name);
+  if (entry == port->properties.end()) {
     return std::nullopt;
   }
   return entry->second;
 }
 
-std::vector<std::pair<std::string, bool>> io_port_get_flags(const IOPort *ioport) {
-  return {ioport->properties.begin(), ioport->properties.end()};
+std::vector<std::pair<std::string, bool>> io_port_get_flags(const IOPort *port) {
+  return {port->properties.begin(), port->properties.end()};
 }
 
-bool io_port_is_ioport(const IOPort *ioport) {
-  return ioport && io_port_get_flag(ioport, "ioport");
+bool io_port_is_ioport(const IOPort *port) {
+  return port && io_port_get_flag(port, "ioport");
 }
 
-bool io_port_set_mode(IOPort *ioport, int mode) {
+bool io_port_set_mode(IOPort *port, int mode) {
   if (mode != PORT_MODE_MONOSTABLE && mode != PORT_MODE_BISTABLE) {
     return false;
   }
-  ioport->mode = mode;
+  port->mode = mode;
   return true;
 }
 
-int io_port_get_mode(const IOPort *ioport) {
-  return ioport ? ioport->mode : 0;
+int io_port_get_mode(const IOPort *port) {
+  return port ? port->mode : 0;
 }
 
-void io_port_set_delay_time(IOPort *ioport, std::int32_t delay_time) {
-  ioport->delay_time = delay_time;
+void io_port_set_delay_time(IOPort *port, std::int32_t delay_time) {
+  port->delay_time = delay_time;
 }
 
-std::int32_t io_port_get_delay_time(const IOPort *ioport) {
-  return ioport ? ioport->delay_time : -1;
+std::int32_t io_port_get_delay_time(const IOPort *port) {
+  return port ? port->delay_time : -1;
 }
 
-void io_port_set_pulse_time(IOPort *ioport, std::uint32_t pulse_time) {
-  ioport->pulse_time = pulse_time;
+void io_port_set_pulse_time(IOPort *port, std::uint32_t pulse_time) {
+  port->pulse_time = pulse_time;
 }
 
-std::uint32_t io_port_get_pulse_time(const IOPort *ioport) {
-  return ioport->pulse_time;
+std::uint32_t io_port_get_pulse_time(const IOPort *port) {
+  return port->pulse_time;
 }
 
-void io_port_set_button(IOPort *ioport, int button) {
-  ioport->button = button;
+void io_port_set_button(IOPort *port, int button) {
+  port->button = button;
 }
 
-int io_port_get_button(const IOPort *ioport) {
-  return ioport->button;
+int io_port_get_button(const IOPort *port) {
+  return port->button;
 }
 
-void io_port_set_spare_setting(IOPort *ioport, std::uint32_t value) {
+void io_port_set_spare_setting(IOPort *port, std::uint32_t value) {
   if (value != 0) {
-    ioport->spare_setting = value;
+    port->spare_setting = value;
   }
 }
 
-std::uint32_t io_port_get_spare_setting(const IOPort *ioport) {
-  return ioport ? ioport->spare_setting : 0;
+std::uint32_t io_port_get_spare_setting(const IOPort *port) {
+  return port ? port->spare_setting : 0;
 }

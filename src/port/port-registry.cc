@@ -25,43 +25,43 @@ Registry &registry() {
   return instance;
 }
 
-IOPortRef new_reference(IOPort *ioport) {
-  io_port_ref(ioport);
-  return IOPortRef(ioport);
+IOPortRef new_reference(IOPort *port) {
+  io_port_ref(port);
+  return IOPortRef(port);
 }
 
-bool takes_part(const IOPort *ioport) {
-  return io_port_is_ioport(ioport) || io_port_get_flag(ioport, "virtual");
+bool takes_part(const IOPort *port) {
+  return io_port_is_ioport(port) || io_port_get_flag(port, "virtual");
 }
 
 IOPortRef find_in(const Ports &ports, std::uint32_t number) {
-  const auto found = std::find_if(ports.rbegin(), ports.rend(), [&](const IOPort *ioport) {
-    return std::cmp_equal(ioport->number, number) && takes_part(ioport);
+  const auto found = std::find_if(ports.rbegin(), ports.rend(), [&](const IOPort *port) {
+    return std::cmp_equal(port->number, number) && takes_part(port);
   });
   return found == ports.rend() ? nullptr : new_reference(*found);
 }
 
-void put_in_front(Ports &ports, IOPort *ioport) {
-  ports.insert(ports.begin(), ioport);
+void put_in_front(Ports &ports, IOPort *port) {
+  ports.insert(ports.begin(), port);
 }
 
 std::uint32_t count_role(bool input) {
   const std::lock_guard lock(registry().lock);
   const auto &ports = registry().active;
   return static_cast<std::uint32_t>(
-      std::count_if(ports.begin(), ports.end(), [&](const IOPort *ioport) {
-        return io_port_is_ioport(ioport) && io_port_direction_input(ioport) == input;
+      std::count_if(ports.begin(), ports.end(), [&](const IOPort *port) {
+        return io_port_is_ioport(port) && io_port_direction_input(port) == input;
       }));
 }
 
 // A document may declare a port without a backend, or name one that does not exist. Such a port is
 // kept, so that it can be listed, but it never comes into service.
-void set_up(IOPort *ioport) {
-  if (io_port_has_backend(ioport)) {
-    io_port_begin_setup(ioport);
+void set_up(IOPort *port) {
+  if (io_port_has_backend(port)) {
+    io_port_begin_setup(port);
   } else {
-    io_port_note_fault(ioport, "it has no backend");
-    log_warning("Port %s has no backend and stays out of service", io_port_describe(ioport));
+    io_port_note_fault(port, "it has no backend");
+    log_warning("Port %s has no backend and stays out of service", io_port_describe(port));
   }
 }
 
@@ -70,12 +70,12 @@ template <typename Predicate>
 std::size_t move_ports(Ports &from, Ports &to, Predicate moves) {
   Ports stay;
   std::size_t moved = 0;
-  for (IOPort *ioport : std::exchange(from, {})) {
-    if (moves(ioport)) {
-      put_in_front(to, ioport);
+  for (IOPort *port : std::exchange(from, {})) {
+    if (moves(port)) {
+      put_in_front(to, port);
       ++moved;
     } else {
-      stay.push_back(ioport);
+      stay.push_back(port);
     }
   }
   from = std::move(stay);
@@ -93,7 +93,7 @@ std::vector<IOPortRef> snapshot(const Ports &list) {
 // The ports in service that can be called.
 std::vector<IOPortRef> snapshot_with_backend() {
   auto ports = snapshot(registry().active);
-  std::erase_if(ports, [](const IOPortRef &ioport) { return !io_port_has_backend(ioport.get()); });
+  std::erase_if(ports, [](const IOPortRef &port) { return !io_port_has_backend(port.get()); });
   return ports;
 }
 
@@ -104,8 +104,8 @@ void when_all_settled(const std::vector<IOPortRef> &ports, std::function<void()>
       done();
     }
   };
-  for (const auto &ioport : ports) {
-    io_port_when_settled(ioport.get(), one_settled);
+  for (const auto &port : ports) {
+    io_port_when_settled(port.get(), one_settled);
   }
   one_settled();
 }
@@ -114,8 +114,8 @@ void when_all_settled(const std::vector<IOPortRef> &ports, std::function<void()>
 // ask the registry. `done` is called when it is clear which of them came up.
 void set_up_all(const Ports &list, std::function<void()> done) {
   const auto ports = snapshot(list);
-  for (const auto &ioport : ports) {
-    set_up(ioport.get());
+  for (const auto &port : ports) {
+    set_up(port.get());
   }
   when_all_settled(ports, std::move(done));
 }
@@ -134,7 +134,7 @@ Retries &retries() {
 std::size_t bring_back() {
   const std::lock_guard lock(registry().lock);
   return move_ports(registry().parked, registry().active,
-                    [](const IOPort *ioport) { return ioport->set_up.load(); });
+                    [](const IOPort *port) { return port->set_up.load(); });
 }
 
 void retry_parked() {
@@ -155,19 +155,19 @@ void retry_parked() {
 // In the order of the description. Gives the number of those in service.
 std::size_t log_service_of(const std::vector<IOPortRef> &ports, const char *otherwise) {
   std::size_t in_service = 0;
-  for (const auto &ioport : ports | std::views::reverse) {
-    if (io_port_in_service(ioport.get())) {
+  for (const auto &port : ports | std::views::reverse) {
+    if (io_port_in_service(port.get())) {
       ++in_service;
     } else {
-      log_warning("Port %s, number %d, is out of service %s: %s", io_port_describe(ioport.get()),
-                  ioport->number, otherwise, io_port_fault(ioport.get()).c_str());
+      log_warning("Port %s, number %d, is out of service %s: %s", io_port_describe(port.get()),
+                  port->number, otherwise, io_port_fault(port.get()).c_str());
     }
   }
   return in_service;
 }
 
-std::string default_input_name(const IOPort *ioport, int inputs_seen) {
-  return ioport->id == "pir_detector" ? "PIR sensor" : "Input " + std::to_string(inputs_seen);
+std::string default_input_name(const IOPort *port, int inputs_seen) {
+  return port->id == "pir_detector" ? "PIR sensor" : "Input " + std::to_string(inputs_seen);
 }
 
 struct NameCounters {
@@ -175,27 +175,27 @@ struct NameCounters {
   int outputs = 0;
 };
 
-void assign_default_name(IOPort *ioport, NameCounters &seen) {
-  if (ioport->type != PORT_OUTPUT) {
+void assign_default_name(IOPort *port, NameCounters &seen) {
+  if (port->type != PORT_OUTPUT) {
     ++seen.inputs;
-    if (!ioport->input_name) {
-      ioport->input_name = default_input_name(ioport, seen.inputs);
+    if (!port->input_name) {
+      port->input_name = default_input_name(port, seen.inputs);
     }
   }
-  if (ioport->type != PORT_INPUT) {
+  if (port->type != PORT_INPUT) {
     ++seen.outputs;
-    if (!ioport->output_name) {
-      ioport->output_name = "Output " + std::to_string(seen.outputs);
+    if (!port->output_name) {
+      port->output_name = "Output " + std::to_string(seen.outputs);
     }
   }
 }
 
 }  // namespace
 
-void port_registry_add(IOPort *ioport) {
+void port_registry_add(IOPort *port) {
   const std::lock_guard lock(registry().lock);
-  io_port_ref(ioport);
-  put_in_front(registry().active, ioport);
+  io_port_ref(port);
+  put_in_front(registry().active, port);
 }
 
 IOPortRef port_registry_nth(std::size_t n) {
@@ -216,8 +216,8 @@ IOPortRef port_registry_find_parked(std::uint32_t number) {
 
 IOPort *port_registry_find_by_id_locked(const std::string &id) {
   const auto &ports = registry().active;
-  const auto found = std::find_if(ports.begin(), ports.end(),
-                                  [&](const IOPort *ioport) { return ioport->id == id; });
+  const auto found =
+      std::find_if(ports.begin(), ports.end(), [&](const IOPort *port) { return port->id == id; });
   return found == ports.end() ? nullptr : *found;
 }
 
@@ -250,9 +250,9 @@ std::uint32_t port_registry_count_inputs() {
 
 std::vector<std::uint32_t> port_registry_supervisable_numbers() {
   std::vector<std::uint32_t> numbers;
-  port_registry_for_each([&](IOPort *ioport) {
-    if (io_port_is_supervisable(ioport)) {
-      numbers.push_back(static_cast<std::uint32_t>(ioport->number));
+  port_registry_for_each([&](IOPort *port) {
+    if (io_port_is_supervisable(port)) {
+      numbers.push_back(static_cast<std::uint32_t>(port->number));
     }
   });
   return numbers;
@@ -261,16 +261,16 @@ std::vector<std::uint32_t> port_registry_supervisable_numbers() {
 bool port_registry_any_port_active() {
   const std::lock_guard lock(registry().lock);
   const auto &ports = registry().active;
-  return std::any_of(ports.begin(), ports.end(), [](IOPort *ioport) {
-    return io_port_got_port_any(ioport) && io_port_get_state(ioport);
+  return std::any_of(ports.begin(), ports.end(), [](IOPort *port) {
+    return io_port_got_port_any(port) && io_port_get_state(port);
   });
 }
 
 void port_registry_for_each(const std::function<void(IOPort *)> &visit) {
   const std::lock_guard lock(registry().lock);
-  for (IOPort *ioport : registry().active) {
-    if (io_port_has_backend(ioport)) {
-      visit(ioport);
+  for (IOPort *port : registry().active) {
+    if (io_port_has_backend(port)) {
+      visit(port);
     }
   }
 }
@@ -278,8 +278,8 @@ void port_registry_for_each(const std::function<void(IOPort *)> &visit) {
 void port_registry_assign_default_names() {
   NameCounters seen;
   for (std::uint32_t number = 0; number < port_registry_count(); ++number) {
-    if (const IOPortRef ioport = port_registry_find(number)) {
-      assign_default_name(ioport.get(), seen);
+    if (const IOPortRef port = port_registry_find(number)) {
+      assign_default_name(port.get(), seen);
     }
   }
 }
@@ -290,7 +290,7 @@ void port_registry_setup_all() {
   serve_main_loop_until([&] { return settled; });
   const std::lock_guard lock(registry().lock);
   move_ports(registry().active, registry().parked,
-             [](const IOPort *ioport) { return ioport->optional && !ioport->set_up; });
+             [](const IOPort *port) { return port->optional && !port->set_up; });
 }
 
 void port_registry_retry_parked(std::function<void(std::size_t)> done) {
@@ -300,16 +300,16 @@ void port_registry_retry_parked(std::function<void(std::size_t)> done) {
   }
 }
 
-void port_registry_park(IOPort *ioport) {
+void port_registry_park(IOPort *port) {
   const std::lock_guard lock(registry().lock);
-  if (ioport->optional && std::erase(registry().active, ioport) > 0) {
-    put_in_front(registry().parked, ioport);
+  if (port->optional && std::erase(registry().active, port) > 0) {
+    put_in_front(registry().parked, port);
   }
 }
 
 void port_registry_arm_watches() {
-  for (const auto &ioport : snapshot_with_backend()) {
-    io_port_set_watch(ioport.get());
+  for (const auto &port : snapshot_with_backend()) {
+    io_port_set_watch(port.get());
   }
 }
 
@@ -322,9 +322,9 @@ void port_registry_log_service() {
 }
 
 void port_registry_declare_events() {
-  for (const auto &ioport : snapshot_with_backend()) {
-    if (io_port_events_enabled(ioport.get())) {
-      io_port_declare_events(ioport.get());
+  for (const auto &port : snapshot_with_backend()) {
+    if (io_port_events_enabled(port.get())) {
+      io_port_declare_events(port.get());
     }
   }
 }
@@ -332,17 +332,17 @@ void port_registry_declare_events() {
 void port_registry_drop_all() {
   std::unique_lock lock(registry().lock);
   Ports ports = std::exchange(registry().active, {});
-  for (IOPort *ioport : std::exchange(registry().parked, {})) {
-    ports.push_back(ioport);
+  for (IOPort *port : std::exchange(registry().parked, {})) {
+    ports.push_back(port);
   }
   lock.unlock();
-  for (IOPort *ioport : ports) {
-    io_port_stop_sequence_and_lock(ioport).unlock();
+  for (IOPort *port : ports) {
+    io_port_stop_sequence_and_lock(port).unlock();
   }
   io_port_wait_for_action_threads();
   run_posted_work();  // what is still under way for a port must not outlive it
-  for (IOPort *ioport : ports) {
-    io_port_destroy(ioport);
+  for (IOPort *port : ports) {
+    io_port_destroy(port);
   }
 }
 

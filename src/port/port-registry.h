@@ -17,7 +17,7 @@
 #include "port/ioport.h"
 
 // Takes a reference of its own.
-void port_registry_add(IOPort *ioport);
+void port_registry_add(IOPort *port);
 // The n-th port from the newest, or none.
 IOPortRef port_registry_nth(std::size_t n);
 // The port that clients mean by a number: flagged "ioport" or "virtual", the first declared where
@@ -51,7 +51,7 @@ void port_registry_setup_all();
 // them has settled. What is asked for during a pass begins with the next one.
 void port_registry_retry_parked(std::function<void(std::size_t)> done);
 // Parks an optional port; others stay where they are.
-void port_registry_park(IOPort *ioport);
+void port_registry_park(IOPort *port);
 void port_registry_arm_watches();
 // Says in the log how many ports are in service, and why each of the others is not.
 void port_registry_log_service();

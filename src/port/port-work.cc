@@ -8,9 +8,9 @@
 
 namespace {
 
-IOPortRef new_reference(IOPort *ioport) {
-  io_port_ref(ioport);
-  return IOPortRef(ioport);
+IOPortRef new_reference(IOPort *port) {
+  io_port_ref(port);
+  return IOPortRef(port);
 }
 
 // The callbacks that have waited long enough. The caller holds the lock.
@@ -28,8 +28,8 @@ std::vector<std::function<void()>> take_due(BackgroundWork &work) {
 
 }  // namespace
 
-PortWork::PortWork(IOPort *ioport) : port_(new_reference(ioport)) {
-  BackgroundWork &work = ioport->background;
+PortWork::PortWork(IOPort *port) : port_(new_reference(port)) {
+  BackgroundWork &work = port->background;
   const std::lock_guard lock(work.lock);
   ++work.begun;
 }
@@ -49,8 +49,8 @@ PortWork::~PortWork() {
   });
 }
 
-void io_port_when_settled(IOPort *ioport, std::function<void()> settled) {
-  BackgroundWork &work = ioport->background;
+void io_port_when_settled(IOPort *port, std::function<void()> settled) {
+  BackgroundWork &work = port->background;
   std::unique_lock lock(work.lock);
   if (work.ended < work.begun) {
     work.waiting.push_back({work.begun, std::move(settled)});
@@ -60,17 +60,17 @@ void io_port_when_settled(IOPort *ioport, std::function<void()> settled) {
   settled();
 }
 
-bool io_port_settle_or_cancel(IOPort *ioport) {
-  BackgroundWork &work = ioport->background;
+bool io_port_settle_or_cancel(IOPort *port) {
+  BackgroundWork &work = port->background;
   std::unique_lock lock(work.lock);
   const std::uint64_t until = work.begun;
-  while (work.ended < until && !ioport->cancel_sequence) {
+  while (work.ended < until && !port->cancel_sequence) {
     work.changed.wait(lock);
   }
-  return !ioport->cancel_sequence;
+  return !port->cancel_sequence;
 }
 
-void io_port_cancel_wait(IOPort *ioport) {
-  const std::lock_guard lock(ioport->background.lock);
-  ioport->background.changed.notify_all();
+void io_port_cancel_wait(IOPort *port) {
+  const std::lock_guard lock(port->background.lock);
+  port->background.changed.notify_all();
 }

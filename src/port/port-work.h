@@ -9,7 +9,7 @@
 class PortWork {
  public:
   // Any thread.
-  explicit PortWork(IOPort *ioport);
+  explicit PortWork(IOPort *port);
   PortWork(const PortWork &) = delete;
   PortWork &operator=(const PortWork &) = delete;
   // Any thread.

@@ -88,15 +88,15 @@ std::string readable_name(std::string_view raw) {
   return last == name.data() ? std::string() : std::string(name.data() + 1, last);
 }
 
-void import_name(const Group &group, const Entry &entry, IOPort *ioport, bool input) {
+void import_name(const Group &group, const Entry &entry, IOPort *port, bool input) {
   const std::string name = readable_name(entry.value);
   if (!port_name_valid(name)) {
     log_warning("%s in group %s is too long for a name of port %s and is left out", entry.key,
-                group.name, io_port_describe(ioport));
+                group.name, io_port_describe(port));
   } else if (input) {
-    io_port_set_input_name(ioport, name);
+    io_port_set_input_name(port, name);
   } else {
-    io_port_set_output_name(ioport, name);
+    io_port_set_output_name(port, name);
   }
 }
 
@@ -110,46 +110,45 @@ std::optional<std::uint32_t> import_time(const Group &group, const Entry &entry)
   return number ? std::optional(static_cast<std::uint32_t>(*number)) : std::nullopt;
 }
 
-Next import_sense(const Group &group, const Entry &entry, IOPort *ioport, bool input) {
+Next import_sense(const Group &group, const Entry &entry, IOPort *port, bool input) {
   const auto activelow = parse_activelow(entry.value);
   if (!activelow) {
     return report_unreadable(group, entry.key);
   }
-  io_port_set_activelow(ioport, *activelow, input);
+  io_port_set_activelow(port, *activelow, input);
   return Next::kKey;
 }
 
 Next import_input(const Group &group, const Entry &entry, std::uint64_t number) {
-  const IOPortRef ioport = find_port(number);
-  if (!ioport) {
+  const IOPortRef port = find_port(number);
+  if (!port) {
     std::fprintf(stderr, "No port %" G_GUINT64_FORMAT " to write parhand data to.\n", number);
     return Next::kStop;
   }
   const std::string_view key = entry.key;
   if (key == "Name") {
-    import_name(group, entry, ioport.get(), true);
+    import_name(group, entry, port.get(), true);
     return Next::kKey;
   }
-  return key == "Trig" ? import_sense(group, entry, ioport.get(), true)
+  return key == "Trig" ? import_sense(group, entry, port.get(), true)
                        : report_unreadable(group, entry.key);
 }
 
 // The keys that can't be refused. False: it is another key.
-bool import_output_behaviour(const Group &group, const Entry &entry, IOPort *ioport) {
+bool import_output_behaviour(const Group &group, const Entry &entry, IOPort *port) {
   const std::string_view key = entry.key;
   if (key == "Name") {
-    import_name(group, entry, ioport, false);
+    import_name(group, entry, port, false);
   } else if (key == "Button") {
-    io_port_set_button(ioport, parse_button(entry.value).value_or(io_port_get_button(ioport)));
+    io_port_set_button(port, parse_button(entry.value).value_or(io_port_get_button(port)));
   } else if (key == "PulseTime") {
-    io_port_set_pulse_time(ioport,
-                           import_time(group, entry).value_or(io_port_get_pulse_time(ioport)));
+    io_port_set_pulse_time(port, import_time(group, entry).value_or(io_port_get_pulse_time(port)));
   } else if (key == "DelayTime") {
     if (const auto time = import_time(group, entry)) {
-      io_port_set_delay_time(ioport, static_cast<std::int32_t>(*time));
+      io_port_set_delay_time(port, static_cast<std::int32_t>(*time));
     }
   } else if (key == "Mode") {
-    io_port_set_mode(ioport, parse_mode(entry.value).value_or(PORT_MODE_MONOSTABLE));
+    io_port_set_mode(port, parse_mode(entry.value).value_or(PORT_MODE_MONOSTABLE));
   } else {
     return false;
   }
@@ -157,22 +156,22 @@ bool import_output_behaviour(const Group &group, const Entry &entry, IOPort *iop
 }
 
 Next import_output(const Group &group, const Entry &entry, std::uint64_t number) {
-  const IOPortRef ioport = find_port(number);
-  if (!ioport) {
+  const IOPortRef port = find_port(number);
+  if (!port) {
     log_warning("No port for the parhand data of group %s", group.name);
     return Next::kGroup;
   }
-  if (import_output_behaviour(group, entry, ioport.get())) {
+  if (import_output_behaviour(group, entry, port.get())) {
     return Next::kKey;
   }
-  return std::string_view(entry.key) == "Active" ? import_sense(group, entry, ioport.get(), false)
+  return std::string_view(entry.key) == "Active" ? import_sense(group, entry, port.get(), false)
                                                  : report_unreadable(group, "Output");
 }
 
 // The port is told its direction when it is set up.
 Next import_port(const Group &group, const Entry &entry, std::uint64_t number) {
-  const IOPortRef ioport = find_port(number);
-  if (!ioport || io_port_get_type(ioport.get()) != PORT_CONFIGURABLE ||
+  const IOPortRef port = find_port(number);
+  if (!port || io_port_get_type(port.get()) != PORT_CONFIGURABLE ||
       std::string_view(entry.key) != "Direction") {
     return Next::kKey;
   }
@@ -180,7 +179,7 @@ Next import_port(const Group &group, const Entry &entry, std::uint64_t number) {
   if (!input) {
     return report_unreadable(group, entry.key);
   }
-  io_port_restore_direction(ioport.get(), *input);
+  io_port_restore_direction(port.get(), *input);
   return Next::kKey;
 }
 

@@ -125,8 +125,8 @@ bool write_configuration(const std::string &file) {
   return !error;
 }
 
-void set_conf_vals(IOPort *ioport) {
-  if (const auto settings = port_settings_take(ioport)) {
+void set_conf_vals(IOPort *port) {
+  if (const auto settings = port_settings_take(port)) {
     port_settings_store(*settings, key_file.get());
   }
 }
@@ -192,25 +192,25 @@ void param_free_configuration() {
   key_file.reset();
 }
 
-bool param_get_conf_vals(IOPort *ioport) {
+bool param_get_conf_vals(IOPort *port) {
   const std::lock_guard lock(settings_lock);
   g_return_val_if_fail(key_file != NULL, false);
-  return port_settings_apply(key_file.get(), key_file_path, ioport);
+  return port_settings_apply(key_file.get(), key_file_path, port);
 }
 
-void param_set_conf_vals(IOPort *ioport) {
+void param_set_conf_vals(IOPort *port) {
   const std::lock_guard lock(settings_lock);
   g_return_if_fail(key_file != NULL);
-  set_conf_vals(ioport);
+  set_conf_vals(port);
 }
 
-void param_save_for_port(IOPort *ioport, const std::string &file) {
+void param_save_for_port(IOPort *port, const std::string &file) {
   const std::lock_guard lock(settings_lock);
-  store(file, [&] { set_conf_vals(ioport); });
+  store(file, [&] { set_conf_vals(port); });
 }
 
-void param_request_save(IOPort *ioport, const std::string &file, std::function<void()> ended) {
-  auto settings = port_settings_take(ioport);
+void param_request_save(IOPort *port, const std::string &file, std::function<void()> ended) {
+  auto settings = port_settings_take(port);
   if (!settings) {
     if (ended) {
       post_to_main_loop(std::move(ended));
@@ -224,8 +224,8 @@ void param_request_save(IOPort *ioport, const std::string &file, std::function<v
 void param_save_all(const std::string &file) {
   std::vector<IOPortRef> ports;
   for (std::uint32_t number = 0; number < port_registry_count(); ++number) {
-    if (IOPortRef ioport = port_registry_find(number)) {
-      ports.push_back(std::move(ioport));
+    if (IOPortRef port = port_registry_find(number)) {
+      ports.push_back(std::move(port));
     }
   }
   if (ports.empty()) {
@@ -233,8 +233,8 @@ void param_save_all(const std::string &file) {
   }
   const std::lock_guard lock(settings_lock);
   store(file, [&] {
-    for (const auto &ioport : ports) {
-      set_conf_vals(ioport.get());
+    for (const auto &port : ports) {
+      set_conf_vals(port.get());
     }
   });
 }

@@ -25,17 +25,17 @@ void param_free_configuration();
 
 // Copies the port's group into the port. False when there is none, or when reading stopped at a key
 // that is missing or malformed; what was read before that key stays.
-bool param_get_conf_vals(IOPort *ioport);
+bool param_get_conf_vals(IOPort *port);
 // Copies the port's settings into its group.
-void param_set_conf_vals(IOPort *ioport);
+void param_set_conf_vals(IOPort *port);
 
 // Stores the settings of one port: into the key file in memory when one is held, else by reading,
 // changing and replacing the file. What goes wrong is said on standard error. Waits for storage.
-void param_save_for_port(IOPort *ioport, const std::string &file);
+void param_save_for_port(IOPort *port, const std::string &file);
 // Has the storage writer do the same with the settings that the port has now, and does not wait.
 // Requests that wait share one read and one write, and of several for one port the last one counts.
 // `ended`, if any, is called from the main loop when the save has ended, well or not.
-void param_request_save(IOPort *ioport, const std::string &file,
+void param_request_save(IOPort *port, const std::string &file,
                         std::function<void()> ended = nullptr);
 // The same for every port in service whose number is below their count, in one go. Waits for
 // storage.

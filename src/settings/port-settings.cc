@@ -14,18 +14,18 @@ namespace {
 constexpr char kFormFeed = '\f';
 constexpr std::string_view kFormFeedEscape = "\\f";
 
-bool has_input_side(const IOPort *ioport) {
-  return io_port_get_type(ioport) != PORT_OUTPUT;
+bool has_input_side(const IOPort *port) {
+  return io_port_get_type(port) != PORT_OUTPUT;
 }
 
-bool has_output_side(const IOPort *ioport) {
-  return io_port_get_type(ioport) != PORT_INPUT;
+bool has_output_side(const IOPort *port) {
+  return io_port_get_type(port) != PORT_INPUT;
 }
 
 // The port's group, or none, said on standard error, when it can't have one: GLib takes anything
 // for a group name but brackets, control characters and nothing at all.
-const char *group_of(IOPort *ioport) {
-  const auto &id = io_port_get_id(ioport);
+const char *group_of(IOPort *port) {
+  const auto &id = io_port_get_id(port);
   if (!id) {
     std::fputs("Port does not have a name!\n", stderr);
     return nullptr;
@@ -46,8 +46,8 @@ const char *group_of(IOPort *ioport) {
 // malformed, which leaves an error, nor after an unknown word for the button, which leaves none.
 class GroupReader {
  public:
-  GroupReader(GKeyFile *file, IOPort *ioport, const char *group)
-      : file_(file), ioport_(ioport), group_(group) {}
+  GroupReader(GKeyFile *file, IOPort *port, const char *group)
+      : file_(file), ioport_(port), group_(group) {}
 
   void read() {
     (void)(read_direction() && read_input_side() && read_output_side() && read_supervision());
@@ -202,35 +202,35 @@ bool GroupReader::read_supervision() {
 
 // --- Taking a port's settings ---
 
-void take_side(IOPort *ioport, bool input, SettingValues &values) {
+void take_side(IOPort *port, bool input, SettingValues &values) {
   std::optional<std::string> input_name;
   std::optional<std::string> output_name;
-  io_port_get_names(ioport, &input_name, &output_name);
+  io_port_get_names(port, &input_name, &output_name);
   values.emplace_back(input ? "input_name" : "output_name",
                       (input ? input_name : output_name).value_or(""));
   values.emplace_back(input ? "input_activelow" : "output_activelow",
-                      io_port_get_activelow(ioport, input));
+                      io_port_get_activelow(port, input));
 }
 
-void take_output_behaviour(IOPort *ioport, SettingValues &values) {
-  const std::string button = button_word(io_port_get_button(ioport));
+void take_output_behaviour(IOPort *port, SettingValues &values) {
+  const std::string button = button_word(io_port_get_button(port));
   if (!button.empty()) {
     values.emplace_back("button_type", button);
   }
-  values.emplace_back("pulse_time", std::uint64_t{io_port_get_pulse_time(ioport)});
-  values.emplace_back("port_mode", std::string(mode_word(io_port_get_mode(ioport))));
+  values.emplace_back("pulse_time", std::uint64_t{io_port_get_pulse_time(port)});
+  values.emplace_back("port_mode", std::string(mode_word(io_port_get_mode(port))));
   // A negative time becomes a very large number: the file has always been read back that way.
   values.emplace_back("delay_time",
-                      static_cast<std::uint64_t>(std::int64_t{io_port_get_delay_time(ioport)}));
+                      static_cast<std::uint64_t>(std::int64_t{io_port_get_delay_time(port)}));
 }
 
-void take_supervision(IOPort *ioport, SettingValues &values) {
+void take_supervision(IOPort *port, SettingValues &values) {
   SupervisedRanges ranges;
-  io_port_get_supervised_ranges(ioport, &ranges);
+  io_port_get_supervised_ranges(port, &ranges);
   const GVariantPtr variant(g_variant_ref_sink(supervised_ranges_to_variant(ranges)));
   const GCharPtr text(g_variant_print(variant.get(), TRUE));
   values.emplace_back("supervised_input_ranges", std::string(text.get()));
-  values.emplace_back("supervised_input", io_port_is_supervised(ioport));
+  values.emplace_back("supervised_input", io_port_is_supervised(port));
 }
 
 // --- Storing them in a group ---
@@ -256,39 +256,39 @@ struct StoreValue {
 
 }  // namespace
 
-bool port_settings_apply(GKeyFile *file, const std::string &path, IOPort *ioport) {
-  const char *group = group_of(ioport);
+bool port_settings_apply(GKeyFile *file, const std::string &path, IOPort *port) {
+  const char *group = group_of(port);
   if (!group || !g_key_file_has_group(file, group)) {
     return false;
   }
-  GroupReader reader(file, ioport, group);
+  GroupReader reader(file, port, group);
   reader.read();
   if (reader.error()) {
     std::fprintf(stderr, "Error parsing param file: %s\n", reader.error().message());
     std::fprintf(stderr, "In file %s, group %s (port %d), key %s\n", path.c_str(), group,
-                 io_port_get_number(ioport), reader.key());
+                 io_port_get_number(port), reader.key());
   }
   return !reader.error();
 }
 
-std::optional<PortSettings> port_settings_take(IOPort *ioport) {
-  const char *group = group_of(ioport);
+std::optional<PortSettings> port_settings_take(IOPort *port) {
+  const char *group = group_of(port);
   if (!group) {
     return std::nullopt;
   }
   PortSettings settings{group, {}};
-  if (io_port_get_type(ioport) == PORT_CONFIGURABLE) {
-    settings.values.emplace_back("input", io_port_direction_input(ioport));
+  if (io_port_get_type(port) == PORT_CONFIGURABLE) {
+    settings.values.emplace_back("input", io_port_direction_input(port));
   }
-  if (has_input_side(ioport)) {
-    take_side(ioport, true, settings.values);
+  if (has_input_side(port)) {
+    take_side(port, true, settings.values);
   }
-  if (has_output_side(ioport)) {
-    take_side(ioport, false, settings.values);
-    take_output_behaviour(ioport, settings.values);
+  if (has_output_side(port)) {
+    take_side(port, false, settings.values);
+    take_output_behaviour(port, settings.values);
   }
-  if (io_port_is_supervisable(ioport)) {
-    take_supervision(ioport, settings.values);
+  if (io_port_is_supervisable(port)) {
+    take_supervision(port, settings.values);
   }
   return settings;
 }

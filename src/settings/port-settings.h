@@ -22,11 +22,11 @@ struct PortSettings {
 };
 
 // None, said on standard error, for a port whose identifier can't name a group. Main thread.
-std::optional<PortSettings> port_settings_take(IOPort *ioport);
+std::optional<PortSettings> port_settings_take(IOPort *port);
 // Puts them into their group; other keys stay as they are. Any thread.
 void port_settings_store(const PortSettings &settings, GKeyFile *file);
 
 // Copies the port's group into the port. False when there is none, or when reading stopped at a key
 // that is missing or malformed, which is said on standard error with `path`, that of the file; what
 // was read before that key stays. Main thread.
-bool port_settings_apply(GKeyFile *file, const std::string &path, IOPort *ioport);
+bool port_settings_apply(GKeyFile *file, const std::string &path, IOPort *port);

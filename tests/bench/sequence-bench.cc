@@ -34,27 +34,27 @@ void on_done(int /*number*/) {
 }
 
 IOPortRef make_output() {
-  IOPortRef ioport(io_port_new());
-  io_port_set_type(ioport.get(), PORT_OUTPUT);
-  io_port_set_backend(ioport.get(), BACKEND_CHECK);
-  io_port_setup(ioport.get());
-  return ioport;
+  IOPortRef port(io_port_new());
+  io_port_set_type(port.get(), PORT_OUTPUT);
+  io_port_set_backend(port.get(), BACKEND_CHECK);
+  io_port_setup(port.get());
+  return port;
 }
 
-void run(IOPort *ioport, int steps) {
+void run(IOPort *port, int steps) {
   ActionSequence sequence = {false, {}};
   for (int i = 0; i < steps; ++i) {
     sequence.steps.push_back({i % 2 == 0, kStepMs});
   }
-  io_port_run_action_sequence(ioport, std::move(sequence));
+  io_port_run_action_sequence(port, std::move(sequence));
   std::unique_lock guard(lock);
   while (!done) {
     ended.wait(guard);
   }
 }
 
-std::vector<double> lateness(IOPort *ioport, int steps) {
-  run(ioport, steps);
+std::vector<double> lateness(IOPort *port, int steps) {
+  run(port, steps);
   io_port_wait_for_action_threads();
   std::vector<double> late;
   for (std::size_t i = 1; i < step_times.size(); ++i) {
@@ -65,15 +65,15 @@ std::vector<double> lateness(IOPort *ioport, int steps) {
 
 // Each cancel meets its sequence at another moment, from before the first step to well into the
 // wait.
-std::vector<double> cancels(IOPort *ioport) {
+std::vector<double> cancels(IOPort *port) {
   constexpr std::int32_t long_ms = 100'000;
   constexpr int delays = 50;
   std::vector<double> times;
   for (int i = 0; i < kCancels; ++i) {
-    io_port_run_action_sequence(ioport, {false, {{true, long_ms}, {false, long_ms}}});
+    io_port_run_action_sequence(port, {false, {{true, long_ms}, {false, long_ms}}});
     g_usleep(static_cast<gulong>(i % delays));
     const gint64 begin = g_get_monotonic_time();
-    io_port_set_activelow(ioport, i % 2 == 0, false);
+    io_port_set_activelow(port, i % 2 == 0, false);
     times.push_back(static_cast<double>(g_get_monotonic_time() - begin));
   }
   return times;
@@ -94,8 +94,8 @@ int main(int argc, char **argv) {
   backends_register();
   port_listener().port_changed = on_port_changed;
   port_listener().action_sequence_done = on_done;
-  const IOPortRef ioport = make_output();
-  print("lateness of a step of 5 ms", lateness(ioport.get(), steps));
-  print("cancelling a sequence", cancels(ioport.get()));
+  const IOPortRef port = make_output();
+  print("lateness of a step of 5 ms", lateness(port.get(), steps));
+  print("cancelling a sequence", cancels(port.get()));
   return 0;
 }

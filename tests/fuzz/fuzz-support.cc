@@ -19,8 +19,8 @@ GLogWriterOutput drop_message(GLogLevelFlags /*level*/, const GLogField * /*fiel
   return G_LOG_WRITER_HANDLED;
 }
 
-bool owns_no_hardware(const IOPort *ioport) {
-  const BackendKind kind = io_port_get_backend(ioport);
+bool owns_no_hardware(const IOPort *port) {
+  const BackendKind kind = io_port_get_backend(port);
   return kind == BACKEND_VIRTUAL || kind == BACKEND_NULL || kind == BACKEND_CHECK;
 }
 
@@ -57,13 +57,13 @@ void fuzz_initialise() {
 }
 
 void fuzz_add_port(int number, const char *id, PortType type, BackendKind backend) {
-  const IOPortRef ioport(io_port_new());
-  io_port_set_id(ioport.get(), id);
-  io_port_set_type(ioport.get(), type);
-  io_port_set_number(ioport.get(), number);
-  io_port_set_backend(ioport.get(), backend);
-  io_port_set_flag(ioport.get(), "ioport", "true");
-  port_registry_add(ioport.get());
+  const IOPortRef port(io_port_new());
+  io_port_set_id(port.get(), id);
+  io_port_set_type(port.get(), type);
+  io_port_set_number(port.get(), number);
+  io_port_set_backend(port.get(), backend);
+  io_port_set_flag(port.get(), "ioport", "true");
+  port_registry_add(port.get());
 }
 
 void fuzz_add_port_of_each_type() {
@@ -76,7 +76,7 @@ bool fuzz_apply_settings(const std::string &path) {
   if (!param_read_configuration(path)) {
     return false;
   }
-  port_registry_for_each([](IOPort *ioport) { param_get_conf_vals(ioport); });
+  port_registry_for_each([](IOPort *port) { param_get_conf_vals(port); });
   param_free_configuration();
   return true;
 }
@@ -84,20 +84,20 @@ bool fuzz_apply_settings(const std::string &path) {
 void fuzz_exercise_ports() {
   for (std::size_t i = 0; i < port_registry_count(); ++i) {
     const IOPortRef ref = port_registry_nth(i);
-    IOPort *ioport = ref.get();
-    if (!io_port_has_backend(ioport) || !owns_no_hardware(ioport)) {
+    IOPort *port = ref.get();
+    if (!io_port_has_backend(port) || !owns_no_hardware(port)) {
       continue;
     }
-    io_port_setup(ioport);
-    io_port_set_watch(ioport);
-    io_port_set_state(ioport, true);
-    io_port_set_virtual(ioport, true);
-    io_port_set_activelow(ioport, true, true);
-    io_port_set_activelow(ioport, true, false);
-    io_port_set_direction(ioport, !io_port_direction_input(ioport));
-    io_port_get_state(ioport);
-    io_port_drop(ioport);
-    io_port_setup(ioport);
+    io_port_setup(port);
+    io_port_set_watch(port);
+    io_port_set_state(port, true);
+    io_port_set_virtual(port, true);
+    io_port_set_activelow(port, true, true);
+    io_port_set_activelow(port, true, false);
+    io_port_set_direction(port, !io_port_direction_input(port));
+    io_port_get_state(port);
+    io_port_drop(port);
+    io_port_setup(port);
   }
   port_registry_count_inputs();
   port_registry_supervisable_numbers();

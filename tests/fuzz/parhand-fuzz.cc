@@ -34,26 +34,26 @@ struct Settings {
   bool operator==(const Settings &other) const = default;
 };
 
-Settings settings_of(const IOPort *ioport) {
-  Settings settings{.input = io_port_direction_input(ioport),
-                    .activelow_input = io_port_get_activelow(ioport, true),
-                    .activelow_output = io_port_get_activelow(ioport, false),
+Settings settings_of(const IOPort *port) {
+  Settings settings{.input = io_port_direction_input(port),
+                    .activelow_input = io_port_get_activelow(port, true),
+                    .activelow_output = io_port_get_activelow(port, false),
                     .input_name = {},
                     .output_name = {},
                     .output = {}};
-  io_port_get_names(ioport, &settings.input_name, &settings.output_name);
-  if (io_port_get_type(ioport) != PORT_INPUT) {
-    settings.output = {.button = io_port_get_button(ioport),
-                       .mode = io_port_get_mode(ioport),
-                       .pulse_time = io_port_get_pulse_time(ioport),
-                       .delay_time = io_port_get_delay_time(ioport)};
+  io_port_get_names(port, &settings.input_name, &settings.output_name);
+  if (io_port_get_type(port) != PORT_INPUT) {
+    settings.output = {.button = io_port_get_button(port),
+                       .mode = io_port_get_mode(port),
+                       .pulse_time = io_port_get_pulse_time(port),
+                       .delay_time = io_port_get_delay_time(port)};
   }
   return settings;
 }
 
 std::vector<Settings> all_settings() {
   std::vector<Settings> all;
-  port_registry_for_each([&](IOPort *ioport) { all.push_back(settings_of(ioport)); });
+  port_registry_for_each([&](IOPort *port) { all.push_back(settings_of(port)); });
   return all;
 }
 

@@ -243,7 +243,7 @@ void DescriptionChecker::apply_flags(const DocumentElement &element) {
     // What is misspelt need not be missed too.
     const bool meant = flag || !near.empty();
     ports_.back().has_flag |= meant && attribute.name != "hidden";
-    ports_.back().ioport |=
+    ports_.back().port |=
         attribute.name == "ioport" && g_ascii_strcasecmp(attribute.value.c_str(), "true") == 0;
   }
 }

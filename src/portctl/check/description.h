@@ -28,7 +28,7 @@ struct DescribedPort {
   bool by_hardware = false;  // only where the hardware id fits
   bool named_first = false;  // a later one takes the place of an earlier one
   bool has_flag = false;     // one that makes clients or the daemon look at it
-  bool ioport = false;
+  bool port = false;
   bool has_event = false;
   bool input_named = false;
   bool output_named = false;

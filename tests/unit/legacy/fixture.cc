@@ -31,16 +31,16 @@ std::string read_file(const std::string &path) {
   return {contents, length};
 }
 
-std::string input_name(const IOPort *ioport) {
+std::string input_name(const IOPort *port) {
   std::optional<std::string> input;
   std::optional<std::string> output;
-  io_port_get_names(ioport, &input, &output);
+  io_port_get_names(port, &input, &output);
   return input.value_or("(unset)");
 }
 
-std::string output_name(const IOPort *ioport) {
+std::string output_name(const IOPort *port) {
   std::optional<std::string> input;
   std::optional<std::string> output;
-  io_port_get_names(ioport, &input, &output);
+  io_port_get_names(port, &input, &output);
   return output.value_or("(unset)");
 }

@@ -35,5 +35,5 @@ class LegacyTest : public testing::Test {
 };
 
 std::string read_file(const std::string &path);
-std::string input_name(const IOPort *ioport);
-std::string output_name(const IOPort *ioport);
+std::string input_name(const IOPort *port);
+std::string output_name(const IOPort *port);

@@ -83,22 +83,22 @@ TEST_F(PropertiesTest, unset_names_say_so) {
 }
 
 TEST_F(PropertiesTest, other_interfaces_name_the_side_in_use) {
-  IOPort *ioport = add_port(0, PORT_CONFIGURABLE);
-  io_port_restore_name(ioport, "in", true);
-  io_port_restore_name(ioport, "out", false);
+  IOPort *port = add_port(0, PORT_CONFIGURABLE);
+  io_port_restore_name(port, "in", true);
+  io_port_restore_name(port, "out", false);
   EXPECT_EQ(get(0, kLegacyService, "Name"), "'in'");
-  io_port_restore_direction(ioport, false);
+  io_port_restore_direction(port, false);
   EXPECT_EQ(get(0, kLegacyService, "Name"), "'out'");
   EXPECT_EQ(set(0, kLegacyService, "Name", text("x")), "Incorrect value for Name");
 }
 
 TEST_F(PropertiesTest, names_have_a_limit) {
-  IOPort *ioport = add_port(0, PORT_INPUT);
-  io_port_restore_name(ioport, "kept", true);
+  IOPort *port = add_port(0, PORT_INPUT);
+  io_port_restore_name(port, "kept", true);
   const std::string long_name(kPortNameMaxBytes + 1, 'x');
   EXPECT_EQ(set(0, kLegacyInputInterface, "Name", text(long_name.c_str())),
             "Incorrect value for Name");
-  EXPECT_EQ(input_name(ioport), "kept");
+  EXPECT_EQ(input_name(port), "kept");
 }
 
 TEST_F(PropertiesTest, ports_that_are_not_the_devices_own_lack_a_direction) {
@@ -119,8 +119,8 @@ TEST_F(PropertiesTest, writes_without_a_port) {
 }
 
 TEST_F(PropertiesTest, values_of_other_types_change_nothing) {
-  IOPort *ioport = add_port(0, PORT_CONFIGURABLE);
-  io_port_restore_name(ioport, "kept", true);
+  IOPort *port = add_port(0, PORT_CONFIGURABLE);
+  io_port_restore_name(port, "kept", true);
   for (const char *name : {"Name", "Trig"}) {
     EXPECT_EQ(set(0, kLegacyInputInterface, name, g_variant_new_string("open")),
               std::string("Incorrect value for ") + name);
@@ -131,18 +131,18 @@ TEST_F(PropertiesTest, values_of_other_types_change_nothing) {
   }
   EXPECT_EQ(set(0, kLegacyService, "Direction", g_variant_new_boolean(TRUE)), "Bad Direction ''");
   EXPECT_TRUE(log().took_warning("Undefined input: , for property: Direction"));
-  EXPECT_EQ(input_name(ioport), "kept");
+  EXPECT_EQ(input_name(port), "kept");
 }
 
 TEST_F(PropertiesTest, bytes_that_are_no_text_change_nothing) {
-  IOPort *ioport = add_port(0, PORT_INPUT);
-  io_port_restore_name(ioport, "kept", true);
+  IOPort *port = add_port(0, PORT_INPUT);
+  io_port_restore_name(port, "kept", true);
   for (const std::string_view raw : {""sv, "bare"sv, "\xff\0"sv, "a\0b"sv}) {
     EXPECT_EQ(set(0, kLegacyInputInterface, "Name", bytes(raw)), "Incorrect value for Name");
     EXPECT_EQ(set(0, kLegacyService, "Direction", bytes(raw)), "Bad Direction ''");
     EXPECT_TRUE(log().took_warning("Undefined input: , for property: Direction"));
   }
-  EXPECT_EQ(input_name(ioport), "kept");
+  EXPECT_EQ(input_name(port), "kept");
 }
 
 TEST_F(PropertiesTest, output_sense_of_an_input) {
