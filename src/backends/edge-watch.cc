@@ -8,11 +8,11 @@
 
 namespace {
 
-constexpr gulong kSettleTime = 500;  // microseconds between an edge and the first look at the line
-// A line that never comes to rest must leave the main loop some room. Far above what a contact that
-// bounces takes.
-constexpr int kRoundsPerTurn = 64;
-constexpr guint kRetryInterval = 1000;  // milliseconds between two looks at an unreadable line
+constexpr gulong kDebounceTime = 500;  // microseconds between an edge and the first read
+// Limits how long a line that keeps changing holds the main loop. Far above what a bouncing contact
+// needs.
+constexpr int kMaxReports = 64;
+constexpr guint kRetryInterval = 1000;  // milliseconds between two reads of an unreadable line
 
 // A source that does nothing until it is made ready, and then runs once.
 gboolean run_once(GSource *source, GSourceFunc callback, gpointer user_data) {
@@ -42,10 +42,10 @@ void EdgeWatch::start(IOPort *port, const GpioPin *pin) {
   const std::lock_guard guard(handles_);
   port_ = port;
   pin_ = pin;
-  if (told_ == kNone) {
-    // Nobody was told of earlier levels: changes count from here.
-    see(libugpio_get_gpio_pin(pin));
-    told_ = seen_;
+  if (reported_level_ == kNone) {
+    // No earlier level was reported: changes count from here.
+    set_level(libugpio_get_gpio_pin(pin));
+    reported_level_ = level_;
   }
   arm();
 }
@@ -56,8 +56,8 @@ void EdgeWatch::stop() {
   recheck_.reset();
   wake_.reset();
   pin_ = nullptr;
-  seen_ = told_ = kNone;
-  was_hidden_ = false;
+  level_ = reported_level_ = kNone;
+  unreported_edge_ = false;
 }
 
 bool EdgeWatch::is_on() const {
@@ -69,7 +69,7 @@ int EdgeWatch::read(const GpioPin *pin) {
   const std::lock_guard guard(handles_);
   const int level = libugpio_get_gpio_pin(pin);
   if (pin == pin_) {
-    note(level);
+    note_read(level);
   }
   return level;
 }
@@ -77,103 +77,103 @@ int EdgeWatch::read(const GpioPin *pin) {
 void EdgeWatch::arm() {
   const int fd = libugpio_gpio_pin_fd(pin_);
   watch_ = fd >= 0 ? Source(g_unix_fd_add(fd, condition_, on_signal, this)) : Source();
-  // Behind the watch: an edge that is signalled as well is served first, and serves for both.
+  // Attached after the watch: an edge that is signalled too is handled first, for both.
   wake_.reset(new_wake_source(on_wake, this));
-  if (was_hidden_ || seen_ != told_) {
-    look_soon();
+  if (unreported_edge_ || level_ != reported_level_) {
+    request_check();
   }
 }
 
-void EdgeWatch::see(int level) {
-  seen_ = level < 0 ? kUnreadable : (level != 0 ? 1 : 0);
+void EdgeWatch::set_level(int level) {
+  level_ = level < 0 ? kUnreadable : (level != 0 ? 1 : 0);
 }
 
-void EdgeWatch::note(int level) {
-  see(level);
-  if (!watch_ || settling_ || seen_ == told_) {
+void EdgeWatch::note_read(int level) {
+  set_level(level);
+  if (!watch_ || debouncing_ || level_ == reported_level_) {
     return;
   }
-  if (seen_ == kUnreadable) {
+  if (level_ == kUnreadable) {
     if (!recheck_) {
-      look_soon();
+      request_check();
     }
-  } else if (!was_hidden_) {
-    report_soon();
+  } else if (!unreported_edge_) {
+    request_report();
   }
 }
 
-void EdgeWatch::look_soon() {
+void EdgeWatch::request_check() {
   if (wake_) {
     g_source_set_ready_time(wake_.get(), 0);
   }
 }
 
-void EdgeWatch::report_soon() {
-  was_hidden_ = true;
-  look_soon();
+void EdgeWatch::request_report() {
+  unreported_edge_ = true;
+  request_check();
 }
 
-void EdgeWatch::recheck_later() {
+void EdgeWatch::schedule_recheck() {
   recheck_ = Source(g_timeout_add(kRetryInterval, on_recheck, this));
 }
 
 gboolean EdgeWatch::on_wake(gpointer self) {
-  static_cast<EdgeWatch *>(self)->look_again();
+  static_cast<EdgeWatch *>(self)->check();
   return G_SOURCE_CONTINUE;
 }
 
 gboolean EdgeWatch::on_recheck(gpointer self) {
   auto *watch = static_cast<EdgeWatch *>(self);
-  watch->look_again();
+  watch->check();
   return G_SOURCE_REMOVE;
 }
 
-void EdgeWatch::look_again() {
-  if (wants_report()) {
-    settle();
+void EdgeWatch::check() {
+  if (needs_report()) {
+    debounce();
   }
 }
 
-// After a read that failed the line may be as it was reported: that is no news.
-bool EdgeWatch::wants_report() {
+// After a failed read the line may still be as it was reported.
+bool EdgeWatch::needs_report() {
   const std::lock_guard guard(handles_);
   recheck_.reset();  // also the one that runs
-  see(libugpio_get_gpio_pin(pin_));
-  if (seen_ == kUnreadable) {
-    recheck_later();
+  set_level(libugpio_get_gpio_pin(pin_));
+  if (level_ == kUnreadable) {
+    schedule_recheck();
     return false;
   }
   const bool was_followed = static_cast<bool>(watch_);
   if (!was_followed) {
     arm();
   }
-  return !was_followed || was_hidden_ || seen_ != told_;
+  return !was_followed || unreported_edge_ || level_ != reported_level_;
 }
 
-void EdgeWatch::settle() {
-  begin_settling();
-  g_usleep(kSettleTime);
-  report_until_rest();
-  end_settling();
+void EdgeWatch::debounce() {
+  begin_debounce();
+  g_usleep(kDebounceTime);
+  report_until_stable();
+  end_debounce();
 }
 
-void EdgeWatch::begin_settling() {
+void EdgeWatch::begin_debounce() {
   const std::lock_guard guard(handles_);
-  settling_ = true;
-  was_hidden_ = false;
+  debouncing_ = true;
+  unreported_edge_ = false;
   recheck_.reset();
   if (wake_) {
     g_source_set_ready_time(wake_.get(), -1);
   }
 }
 
-// A line that does not come to rest is left after some rounds, to be looked at again soon.
-void EdgeWatch::report_until_rest() {
-  for (int round = 0; round < kRoundsPerTurn; ++round) {
+// Stops after some reports when the line keeps changing; it is checked again soon.
+void EdgeWatch::report_until_stable() {
+  for (int round = 0; round < kMaxReports; ++round) {
     const bool state = io_port_get_state(port_);
     {
       const std::lock_guard guard(handles_);
-      told_ = seen_;
+      reported_level_ = level_;
     }
     io_port_report_state(port_, state);
     if (io_port_get_state(port_) == state) {
@@ -182,32 +182,32 @@ void EdgeWatch::report_until_rest() {
   }
 }
 
-void EdgeWatch::end_settling() {
+void EdgeWatch::end_debounce() {
   const std::lock_guard guard(handles_);
-  settling_ = false;
-  if (seen_ == kUnreadable) {
-    recheck_later();
-  } else if (seen_ != told_) {
-    report_soon();
+  debouncing_ = false;
+  if (level_ == kUnreadable) {
+    schedule_recheck();
+  } else if (level_ != reported_level_) {
+    request_report();
   }
 }
 
-bool EdgeWatch::signals_in_vain(int fd) {
+bool EdgeWatch::is_stuck(int fd) {
   const std::lock_guard guard(handles_);
   pollfd line{.fd = fd, .events = POLLPRI, .revents = 0};
-  return seen_ == kUnreadable && poll(&line, 1, 0) > 0;
+  return level_ == kUnreadable && poll(&line, 1, 0) > 0;
 }
 
 // Whatever goes on signalling and can't be acknowledged would keep the main loop from sleeping.
 gboolean EdgeWatch::on_signal(gint fd, GIOCondition condition, gpointer self) {
   auto *watch = static_cast<EdgeWatch *>(self);
   if ((condition & (G_IO_PRI | G_IO_ERR)) != 0) {
-    watch->settle();
+    watch->debounce();
   }
   if ((condition & (G_IO_HUP | G_IO_NVAL)) != 0) {
     log_warning("Port %s: the line is gone and no longer watched", io_port_describe(watch->port_));
     watch->stop();
-  } else if (watch->signals_in_vain(fd)) {
+  } else if (watch->is_stuck(fd)) {
     log_warning("Port %s: the line can't be read", io_port_describe(watch->port_));
     const std::lock_guard guard(watch->handles_);
     watch->watch_.reset();  // until it can be read again

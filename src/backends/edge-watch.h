@@ -1,7 +1,7 @@
-// Follows one GPIO line of a port by its edges. After an edge the line is given time to settle;
-// then the port's state is read and reported until the line rests at what was reported. Reading a
-// line acknowledges its edge, so reads by others are noted here, and what they would have hidden is
-// reported all the same. A line that can't be read is looked at once a second until it can.
+// Follows one GPIO line of a port by its edges. After an edge the line is debounced; then the
+// port's state is read and reported until the line is stable. Reading a line acknowledges its edge,
+// so every read goes through here, and a change that a read has acknowledged is still reported. A
+// line that can't be read is read again once a second.
 //
 // Main thread unless said otherwise.
 #pragma once
@@ -18,13 +18,13 @@ struct IOPort;
 
 class EdgeWatch {
  public:
-  // `handles` is what the owner uses its pins' handles under, since a line wants one thread at a
-  // time; nothing else is locked while it is held. An edge makes `condition` true.
+  // `handles` is the lock under which the owner uses its pins' handles, since a line may be used by
+  // one thread at a time. An edge makes `condition` true.
   EdgeWatch(std::mutex &handles, GIOCondition condition)
       : handles_(handles), condition_(condition) {}
 
-  // Follows the line from now on. Followed already: arms anew, and forgets nothing. No pin, or one
-  // without a handle: there is nothing to follow.
+  // Follows the line. When it is followed already it is armed again, and its last levels are kept.
+  // Without a pin, or without a handle, nothing is followed.
   void start(IOPort *port, const GpioPin *pin);
   void stop();
   [[nodiscard]] bool is_on() const;
@@ -47,33 +47,33 @@ class EdgeWatch {
     }
   };
 
-  void look_soon();
-  void look_again();
+  void request_check();
+  void check();
   void arm();
-  void see(int level);
-  void note(int level);
-  void report_soon();
-  void recheck_later();
-  bool wants_report();
-  void settle();
-  void begin_settling();
-  void report_until_rest();
-  void end_settling();
-  bool signals_in_vain(int fd);
+  void set_level(int level);
+  void note_read(int level);
+  void request_report();
+  void schedule_recheck();
+  bool needs_report();
+  void debounce();
+  void begin_debounce();
+  void report_until_stable();
+  void end_debounce();
+  bool is_stuck(int fd);
 
   std::mutex &handles_;
   const GIOCondition condition_;
   // All that follows is guarded by `handles_`, also what only the main thread changes.
   IOPort *port_ = nullptr;
   const GpioPin *pin_ = nullptr;
-  int seen_ = kNone;         // what the line last read
-  int told_ = kNone;         // what it read when its state was last reported
-  bool settling_ = false;    // its changes are being read and reported
-  bool was_hidden_ = false;  // a change was read and not reported
+  int level_ = kNone;             // what the line last read
+  int reported_level_ = kNone;    // what it read when its state was last reported
+  bool debouncing_ = false;       // its changes are being read and reported
+  bool unreported_edge_ = false;  // a change was read and not reported
   // Main thread only: sources belong to its loop.
   Source watch_;    // of the line's descriptor
   Source recheck_;  // an unreadable line must be looked at again
-  // The line must be looked at without an edge. Made and destroyed by the main thread; any thread
+  // The line must be read without an edge. Made and destroyed by the main thread; any thread
   // may make it ready.
   std::unique_ptr<GSource, DestroySource> wake_;
 };

@@ -8,8 +8,8 @@
 #include "backends/iobox-calls.h"
 #include "base/log.h"
 #include "base/main-queue.h"
-#include "base/patience.h"
 #include "base/signal-handler.h"
+#include "base/timeout-budget.h"
 #include "base/worker.h"
 #include "port/port-work.h"
 
@@ -33,9 +33,9 @@ struct Monitor {
   GObjectPtr<GDBusProxy> proxy;
   SignalHandler signals;
   SignalHandler owner;
-  std::vector<IOPort *> ports;       // those that follow the box
-  std::weak_ptr<Patience> patience;  // of the set-ups that are under way
-  Worker worker{"I/O box"};          // last: its jobs end before what they use goes
+  std::vector<IOPort *> ports;          // those that follow the box
+  std::weak_ptr<TimeoutBudget> budget;  // of the set-ups that are under way
+  Worker worker{"I/O box"};             // last: its jobs end before what they use goes
 };
 
 Monitor &monitor() {
@@ -44,7 +44,7 @@ Monitor &monitor() {
 }
 
 // For a call that waits as long as the bus allows. On the worker's thread.
-IoBoxCall unhurried(GCancellable *cancellable) {
+IoBoxCall with_default_timeout(GCancellable *cancellable) {
   return {monitor().proxy.get(), cancellable, nullptr};
 }
 
@@ -72,7 +72,7 @@ IoBoxMode mode_of(const IOPort *port) {
   return {io_port_get_number(port), data_of(port)->output_value, mode_word(port)};
 }
 
-// Any thread. The box is told in the order of the calls of this.
+// Any thread. Modes are sent in the order of the calls.
 void iobox_set_mode(IOPort *port) {
   IoBoxBackendData *data = data_of(port);
   if (!data->connected) {
@@ -81,25 +81,25 @@ void iobox_set_mode(IOPort *port) {
   const auto work = std::make_shared<PortWork>(port);
   const std::lock_guard lock(data->mode_lock);
   monitor().worker.queue([work, mode = mode_of(port)](GCancellable *cancellable) {
-    iobox_send_mode(unhurried(cancellable), mode);
+    iobox_send_mode(with_default_timeout(cancellable), mode);
   });
 }
 
-void note_level(IoBoxBackendData *data, std::int32_t level) {
+void store_level(IoBoxBackendData *data, std::int32_t level) {
   data->state = level > 0 ? SUPERVISED_STATE_CLOSED : SUPERVISED_STATE_OPEN;
 }
 
 // Any thread. The level counts from now on, however long the box takes.
 void drive(IOPort *port, std::int32_t level) {
   IoBoxBackendData *data = data_of(port);
-  note_level(data, level);
+  store_level(data, level);
   data->output_value = level;
   iobox_set_mode(port);
 }
 
-// --- What the box says ---
+// --- States from the box ---
 
-void take_state(IOPort *port, SupervisedRangeState state) {
+void update_state(IOPort *port, SupervisedRangeState state) {
   IoBoxBackendData *data = data_of(port);
   const auto now = static_cast<std::int32_t>(state);
   if (data->state.exchange(now) != now && data->watching) {
@@ -107,24 +107,23 @@ void take_state(IOPort *port, SupervisedRangeState state) {
   }
 }
 
-// A question for the state of an input, on its way to the box and back. While it is, the port may
-// be set up anew or become an output, and a signal may overtake the answer: where one was heard
-// since the question left, the answer says nothing newer.
-struct Question {
+// A query for the state of an input. While it is under way the port may be set up again or become
+// an output, and a signal may overtake the reply: when one has arrived, the reply is out of date.
+struct Query {
   IOPort *port = nullptr;
-  IoBoxHeard heard;  // also tells one set-up of the port from the next
-  unsigned heard_before = 0;
+  IoBoxSignalCount signal_count;  // also tells one set-up of the port from the next
+  unsigned count_before = 0;
 };
 
-bool still_asked(const Question &question) {
-  const IoBoxBackendData *data = data_of(question.port);
-  return data && data->heard == question.heard && *question.heard == question.heard_before;
+bool is_current(const Query &query) {
+  const IoBoxBackendData *data = data_of(query.port);
+  return data && data->signal_count == query.signal_count &&
+         *query.signal_count == query.count_before;
 }
 
-std::optional<SupervisedRangeState> ask_state(const IoBoxCall &call, int number,
-                                              Question &question) {
-  question.heard_before = *question.heard;
-  return iobox_ask_state(call, number);
+std::optional<SupervisedRangeState> query_state(const IoBoxCall &call, int number, Query &query) {
+  query.count_before = *query.signal_count;
+  return iobox_query_state(call, number);
 }
 
 void on_proxy_signal(GDBusProxy * /*proxy*/, const char * /*sender*/, const char *signal,
@@ -134,21 +133,21 @@ void on_proxy_signal(GDBusProxy * /*proxy*/, const char * /*sender*/, const char
   }
 }
 
-// --- A service that is started anew knows neither modes nor whom it has told of which state ---
+// --- After a restart of the service, which then knows no modes ---
 
-void tell_anew(IOPort *port) {
+void resend_mode(IOPort *port) {
   const auto work = std::make_shared<PortWork>(port);
-  Question question = {port, data_of(port)->heard, 0};
+  Query query = {port, data_of(port)->signal_count, 0};
   const std::lock_guard lock(data_of(port)->mode_lock);
-  monitor().worker.queue([work, question, mode = mode_of(port),
+  monitor().worker.queue([work, query, mode = mode_of(port),
                           input = io_port_input(port)](GCancellable *cancellable) mutable {
-    const IoBoxCall call = unhurried(cancellable);
+    const IoBoxCall call = with_default_timeout(cancellable);
     iobox_send_mode(call, mode);
-    const auto state = input ? ask_state(call, mode.number, question) : std::nullopt;
+    const auto state = input ? query_state(call, mode.number, query) : std::nullopt;
     if (state) {
-      post_to_main_loop([work, question, state] {
-        if (still_asked(question) && io_port_input(question.port)) {
-          take_state(question.port, *state);
+      post_to_main_loop([work, query, state] {
+        if (is_current(query) && io_port_input(query.port)) {
+          update_state(query.port, *state);
         }
       });
     }
@@ -161,7 +160,7 @@ void on_owner_changed(GObject *proxy, GParamSpec * /*property*/, gpointer /*user
   }
   for (IOPort *port : monitor().ports) {
     if (io_port_is_set_up(port)) {
-      tell_anew(port);
+      resend_mode(port);
     }
   }
 }
@@ -191,21 +190,21 @@ bool make_proxy() {
   return true;
 }
 
-// Set-ups that wait behind each other, at start or in a refresh, share their patience.
-std::shared_ptr<Patience> shared_patience() {
-  auto patience = monitor().patience.lock();
-  if (!patience) {
-    patience = std::make_shared<Patience>();
-    monitor().patience = patience;
+// Set-ups that wait behind each other, at start or in a refresh, share one time budget.
+std::shared_ptr<TimeoutBudget> shared_budget() {
+  auto budget = monitor().budget.lock();
+  if (!budget) {
+    budget = std::make_shared<TimeoutBudget>();
+    monitor().budget = budget;
   }
-  return patience;
+  return budget;
 }
 
 // A port that is being set up, on its way to the worker and back.
 struct SetUp {
   std::shared_ptr<PortWork> work;
-  std::shared_ptr<Patience> patience;
-  Question question;
+  std::shared_ptr<TimeoutBudget> budget;
+  Query query;
   IoBoxMode mode{};
   bool input = false;
   const char *fault = nullptr;                // what keeps the port out of service
@@ -214,8 +213,8 @@ struct SetUp {
 };
 
 // On the worker's thread.
-void ask_box(SetUp &set_up, GCancellable *cancellable) {
-  const IoBoxCall call = {monitor().proxy.get(), cancellable, set_up.patience.get()};
+void query_box(SetUp &set_up, GCancellable *cancellable) {
+  const IoBoxCall call = {monitor().proxy.get(), cancellable, set_up.budget.get()};
   if (!iobox_is_connected(call)) {
     set_up.fault = "no I/O box is connected";
     return;
@@ -229,24 +228,24 @@ void ask_box(SetUp &set_up, GCancellable *cancellable) {
     iobox_send_mode(call, set_up.mode);
     return;
   }
-  set_up.state = ask_state(call, set_up.mode.number, set_up.question);
+  set_up.state = query_state(call, set_up.mode.number, set_up.query);
   if (!set_up.state) {
     set_up.fault = "the I/O box does not tell its state";
     log_iobox(kLogLevelUser, kNoInitialState, "Could not get initial IO state");
   }
 }
 
-// The state comes before the events, which say at once how the port is.
+// The state comes before the events, which are sent with it at once.
 void finish_set_up(const SetUp &set_up) {
-  IOPort *port = set_up.question.port;
+  IOPort *port = set_up.query.port;
   IoBoxBackendData *data = data_of(port);
-  if (!data || data->heard != set_up.question.heard) {
+  if (!data || data->signal_count != set_up.query.signal_count) {
     return;
   }
   if (!set_up.input) {
     data->output_value = set_up.mode.level;
-    note_level(data, set_up.mode.level);
-  } else if (set_up.state && still_asked(set_up.question)) {
+    store_level(data, set_up.mode.level);
+  } else if (set_up.state && is_current(set_up.query)) {
     data->state = *set_up.state;
   }
   if (set_up.fault) {
@@ -273,16 +272,16 @@ bool iobox_port_setup(IOPort *port, bool initial_level) {
   }
   data->connected = true;
   data->state = SUPERVISED_STATE_UNDEFINED;
-  data->heard = std::make_shared<std::atomic<unsigned>>(0U);
+  data->signal_count = std::make_shared<std::atomic<unsigned>>(0U);
   follow(port);
   SetUp set_up;
   set_up.work = std::make_shared<PortWork>(port);
-  set_up.patience = shared_patience();
-  set_up.question = {port, data->heard, 0};
+  set_up.budget = shared_budget();
+  set_up.query = {port, data->signal_count, 0};
   set_up.mode = {io_port_get_number(port), initial_level, mode_word(port)};
   set_up.input = io_port_input(port);
   monitor().worker.queue([set_up](GCancellable *cancellable) mutable {
-    ask_box(set_up, cancellable);
+    query_box(set_up, cancellable);
     post_to_main_loop([set_up] { finish_set_up(set_up); });
   });
   return false;  // not yet
@@ -341,10 +340,10 @@ void start_watch(IOPort *port) {
   data_of(port)->watching = true;
 }
 
-// An output has the level that the box is told, not the state that the line had as an input.
+// The level of an output is the one that was sent, not the state of the line as an input.
 void set_direction(IOPort *port, bool input) {
   if (!input) {
-    note_level(data_of(port), data_of(port)->output_value);
+    store_level(data_of(port), data_of(port)->output_value);
   }
   iobox_set_mode(port);
 }
@@ -366,10 +365,10 @@ void iobox_handle_signal(IOPort *port, const char *signal, GVariant *parameters)
   if (number != io_port_get_number(port)) {
     return;
   }
-  if (const auto &heard = data_of(port)->heard) {
-    ++*heard;
+  if (const auto &signal_count = data_of(port)->signal_count) {
+    ++*signal_count;
   }
-  take_state(port, iobox_state_to_portd_state(word));
+  update_state(port, iobox_state_to_portd_state(word));
 }
 
 extern constexpr PortFunctions kIoBoxBackend = {

@@ -6,7 +6,7 @@
 #include <string_view>
 
 #include "base/glib-ptr.h"
-#include "base/patience.h"
+#include "base/timeout-budget.h"
 
 namespace {
 
@@ -29,13 +29,13 @@ constexpr StateWord kStateWords[] = {
 
 // Null when there was no answer, which is logged.
 GVariantPtr iobox_dbus_call(const IoBoxCall &call, const char *method, GVariant *parameters) {
-  const int timeout_ms = call.patience ? call.patience->timeout_ms() : Patience::kBusDefault;
+  const int timeout_ms = call.budget ? call.budget->timeout_ms() : TimeoutBudget::kBusDefault;
   const std::int64_t begun = g_get_monotonic_time();
   Error error;
   GVariantPtr reply(g_dbus_proxy_call_sync(call.proxy, method, parameters, G_DBUS_CALL_FLAGS_NONE,
                                            timeout_ms, call.cancellable, error.out()));
-  if (call.patience) {
-    call.patience->spend(g_get_monotonic_time() - begun);
+  if (call.budget) {
+    call.budget->spend(g_get_monotonic_time() - begun);
   }
   if (!reply) {
     log_iobox(kLogLevelUser, kCallFailed, "Failed to call method %s: %s", method, error.message());
@@ -48,7 +48,7 @@ GVariantPtr call_for(const IoBoxCall &call, const char *method, GVariant *parame
                      const char *type) {
   GVariantPtr reply = iobox_dbus_call(call, method, parameters);
   if (reply && !g_variant_is_of_type(reply.get(), G_VARIANT_TYPE(type))) {
-    log_warning("The I/O box monitor answers %s with %s, not with %s", method,
+    log_warning("The I/O box monitor answered %s with type %s instead of %s", method,
                 g_variant_get_type_string(reply.get()), type);
     reply.reset();
   }
@@ -87,7 +87,7 @@ bool iobox_port_is_enabled(const IoBoxCall &call, int number) {
   return status == "enabled";
 }
 
-std::optional<SupervisedRangeState> iobox_ask_state(const IoBoxCall &call, int number) {
+std::optional<SupervisedRangeState> iobox_query_state(const IoBoxCall &call, int number) {
   const auto word = word_for(call, "GetIOState", number);
   return word ? std::optional(iobox_state_to_portd_state(word->c_str())) : std::nullopt;
 }

@@ -1,5 +1,5 @@
-// The calls of the service that looks after I/O boxes. They wait for its answer, so they are made
-// on the thread that is there for it.
+// The calls to the service that looks after I/O boxes. They block until it answers, so they are
+// made on the worker's thread.
 #pragma once
 
 #include <gio/gio.h>
@@ -10,9 +10,9 @@
 #include "base/log.h"
 #include "port/supervised-range.h"
 
-class Patience;
+class TimeoutBudget;
 
-// Log readers know the messages about boxes by function and line, so both are part of the text.
+// Fixed: the function and the line that messages about boxes begin with.
 struct IoBoxPlace {
   const char *function;
   int line;
@@ -25,10 +25,10 @@ struct IoBoxPlace {
 struct IoBoxCall {
   GDBusProxy *proxy;
   GCancellable *cancellable;
-  Patience *patience;  // null: it waits as long as the bus allows
+  TimeoutBudget *budget;  // null: it waits as long as the bus allows
 };
 
-// What the box is told of a port, as it was when it was asked for.
+// The mode of a port at the time of the request.
 struct IoBoxMode {
   int number;
   std::int32_t level;
@@ -39,7 +39,7 @@ struct IoBoxMode {
 bool iobox_is_connected(const IoBoxCall &call);
 bool iobox_port_is_enabled(const IoBoxCall &call, int number);
 // The state of an input. Unset, with a message, without an answer.
-std::optional<SupervisedRangeState> iobox_ask_state(const IoBoxCall &call, int number);
+std::optional<SupervisedRangeState> iobox_query_state(const IoBoxCall &call, int number);
 // A failure is only logged.
 void iobox_send_mode(const IoBoxCall &call, const IoBoxMode &mode);
 

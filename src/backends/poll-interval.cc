@@ -11,7 +11,7 @@ std::uint32_t poll_interval(const IOPort *port, std::uint32_t described_ms) {
   if (described_ms != 0) {
     return described_ms;
   }
-  log_warning("Port %s: no usable polling interval is given; it is polled every %u ms",
+  log_warning("Port %s: no valid polling interval is given: polling every %u ms",
               io_port_describe(port), kDefaultInterval);
   return kDefaultInterval;
 }

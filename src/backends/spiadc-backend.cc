@@ -86,7 +86,7 @@ std::int32_t read_sample(const SpiAdcBackendData *data) {
   return sample.value_or(0);
 }
 
-gboolean take_sample(gpointer user_data) {
+gboolean poll_sample(gpointer user_data) {
   auto *port = static_cast<IOPort *>(user_data);
   SpiAdcBackendData *data = data_of(port);
   const std::int32_t old = data->state;
@@ -102,7 +102,7 @@ void start_watch(IOPort *port) {
   SpiAdcBackendData *data = data_of(port);
   // A timer that runs goes on: arming it anew would put its next sample off.
   if (data && !data->source) {
-    data->source = Source(g_timeout_add(poll_interval(port, data->timeout), take_sample, port));
+    data->source = Source(g_timeout_add(poll_interval(port, data->timeout), poll_sample, port));
   }
 }
 

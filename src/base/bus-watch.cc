@@ -9,34 +9,34 @@ struct OwnerWatch::State : std::enable_shared_from_this<State> {
   Changed changed;
   GObjectPtr<GDBusConnection> connection;
   std::string owner;
-  std::optional<std::string> told;  // what `changed` was last called with
+  std::optional<std::string> notified;  // what `changed` was last called with
 
-  void note(GDBusConnection *now_connection, const char *now_owner) {
+  void update(GDBusConnection *now_connection, const char *now_owner) {
     connection.reset(now_connection ? static_cast<GDBusConnection *>(g_object_ref(now_connection))
                                     : nullptr);
     owner = now_owner;
-    // Told later: a name that changes hands first vanishes and then appears, in one go.
+    // Deferred: a name that changes its owner vanishes and appears in the same dispatch.
     post_to_main_loop([watch = weak_from_this()] {
       if (const auto state = watch.lock()) {
-        state->tell();
+        state->notify();
       }
     });
   }
 
-  void tell() {
-    if (told != owner) {
-      told = owner;
+  void notify() {
+    if (notified != owner) {
+      notified = owner;
       changed(connection.get(), owner);
     }
   }
 
   static void on_appeared(GDBusConnection *connection, const char * /*name*/, const char *owner,
                           gpointer state) {
-    static_cast<State *>(state)->note(connection, owner);
+    static_cast<State *>(state)->update(connection, owner);
   }
 
   static void on_vanished(GDBusConnection *connection, const char * /*name*/, gpointer state) {
-    static_cast<State *>(state)->note(connection, "");
+    static_cast<State *>(state)->update(connection, "");
   }
 };
 
@@ -54,22 +54,22 @@ namespace {
 
 void on_signal(GDBusConnection * /*connection*/, const char * /*sender*/, const char *object_path,
                const char * /*interface*/, const char * /*member*/, GVariant *parameters,
-               gpointer heard) {
-  (*static_cast<SignalSubscription::Heard *>(heard))(object_path, parameters);
+               gpointer handler) {
+  (*static_cast<SignalSubscription::Handler *>(handler))(object_path, parameters);
 }
 
-void free_heard(gpointer heard) {
-  delete static_cast<SignalSubscription::Heard *>(heard);
+void delete_handler(gpointer handler) {
+  delete static_cast<SignalSubscription::Handler *>(handler);
 }
 
 }  // namespace
 
 SignalSubscription::SignalSubscription(GDBusConnection *connection, const std::string &sender,
-                                       const char *interface, const char *member, Heard heard)
+                                       const char *interface, const char *member, Handler handler)
     : connection_(static_cast<GDBusConnection *>(g_object_ref(connection))),
       id_(g_dbus_connection_signal_subscribe(connection, sender.c_str(), interface, member, nullptr,
                                              nullptr, G_DBUS_SIGNAL_FLAGS_NONE, on_signal,
-                                             new Heard(std::move(heard)), free_heard)) {}
+                                             new Handler(std::move(handler)), delete_handler)) {}
 
 SignalSubscription::SignalSubscription(SignalSubscription &&other) noexcept
     : connection_(std::move(other.connection_)), id_(std::exchange(other.id_, 0)) {}

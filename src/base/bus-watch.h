@@ -1,4 +1,4 @@
-// Following a neighbour on the system bus without ever waiting for it: who owns its name, and its
+// Following a service on the system bus without waiting for it: the owner of its name, and its
 // signals. Main thread only.
 #pragma once
 
@@ -31,14 +31,14 @@ class OwnerWatch {
   guint id_;
 };
 
-// Hears a signal, whatever the object, until it is destroyed.
+// Receives a signal from any object until it is destroyed.
 class SignalSubscription {
  public:
-  using Heard = std::function<void(const char *object_path, GVariant *parameters)>;
+  using Handler = std::function<void(const char *object_path, GVariant *parameters)>;
 
   SignalSubscription() = default;
   SignalSubscription(GDBusConnection *connection, const std::string &sender, const char *interface,
-                     const char *member, Heard heard);
+                     const char *member, Handler handler);
   SignalSubscription(SignalSubscription &&other) noexcept;
   SignalSubscription &operator=(SignalSubscription &&other) noexcept;
   SignalSubscription(const SignalSubscription &) = delete;

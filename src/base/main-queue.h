@@ -10,5 +10,5 @@ void post_to_main_loop(std::function<void()> work);
 // longer runs.
 void run_posted_work();
 // Serves the main loop's sources until `done` holds, which something posted must bring about. Main
-// thread, at start-up, while nobody is served yet.
+// thread, at start-up, before clients are served.
 void serve_main_loop_until(const std::function<bool()> &done);

@@ -13,14 +13,14 @@
 namespace {
 
 // Within the five seconds that a daemon has to end.
-constexpr guint kLastResortMs = 4800;
+constexpr guint kForcedExitMs = 4800;
 
 using MainContextPtr = std::unique_ptr<GMainContext, GlibDeleter<g_main_context_unref>>;
 using SourcePtr = std::unique_ptr<GSource, GlibDeleter<g_source_unref>>;
 
 // The log may be what hangs, or standard error, if nobody reads it.
-gboolean on_last_resort(gpointer /*user_data*/) {
-  constexpr std::string_view message = "portd did not end in time\n";
+gboolean on_forced_exit(gpointer /*user_data*/) {
+  constexpr std::string_view message = "portd did not stop in time\n";
   pollfd error_output = {.fd = STDERR_FILENO, .events = POLLOUT, .revents = 0};
   if (poll(&error_output, 1, 0) > 0) {
     [[maybe_unused]] const auto written = write(STDERR_FILENO, message.data(), message.size());
@@ -30,9 +30,9 @@ gboolean on_last_resort(gpointer /*user_data*/) {
 
 gboolean on_sigterm(gpointer user_data) {
   g_cancellable_cancel(termination_cancellable());
-  const SourcePtr last_resort(g_timeout_source_new(kLastResortMs));
-  g_source_set_callback(last_resort.get(), on_last_resort, nullptr, nullptr);
-  g_source_attach(last_resort.get(), static_cast<GMainContext *>(user_data));
+  const SourcePtr forced_exit(g_timeout_source_new(kForcedExitMs));
+  g_source_set_callback(forced_exit.get(), on_forced_exit, nullptr, nullptr);
+  g_source_attach(forced_exit.get(), static_cast<GMainContext *>(user_data));
   return G_SOURCE_REMOVE;
 }
 

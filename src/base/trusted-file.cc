@@ -43,7 +43,7 @@ std::optional<std::string> target_of(int link, const std::string &path) {
 }
 
 // The path that the links at the end of `path` lead to, followed one by one. What is no link is
-// left to whoever opens it, who learns why it can't be had.
+// left to the caller, whose open fails with the reason.
 std::optional<std::string> follow_trusted_links(const std::string &path, GError **error) {
   std::string reached = path;
   for (int links = 0; links < kMostLinks; ++links) {

@@ -12,7 +12,7 @@
 #include "base/unique-fd.h"
 
 struct RegularFile {
-  UniqueFd fd;  // for reading; none when the file could not be had
+  UniqueFd fd;  // for reading; none when the file could not be opened
   struct stat status {};
 };
 

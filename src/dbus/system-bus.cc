@@ -20,7 +20,7 @@ struct SystemBus {
   GObjectPtr<GDBusConnection> connection;
   std::vector<std::function<void(GDBusConnection *)>> waiting;
   Source retry;
-  bool looking = false;
+  bool connecting = false;
   bool reported_missing = false;
 };
 
@@ -29,15 +29,15 @@ SystemBus &system_bus() {
   return bus;
 }
 
-void look_for_bus();
+void connect_to_bus();
 
 gboolean on_retry(gpointer /*user_data*/) {
   system_bus().retry.forget();
-  look_for_bus();
+  connect_to_bus();
   return G_SOURCE_REMOVE;
 }
 
-void look_again_later(const Error &error) {
+void retry_later(const Error &error) {
   auto &bus = system_bus();
   if (!std::exchange(bus.reported_missing, true)) {
     log_critical("No interface is served until there is a system bus: %s", error.message());
@@ -48,12 +48,12 @@ void look_again_later(const Error &error) {
 void on_bus(GObject * /*source*/, GAsyncResult *result, gpointer /*user_data*/) {
   auto &bus = system_bus();
   Error error;
-  bus.looking = false;
+  bus.connecting = false;
   bus.connection.reset(g_bus_get_finish(result, error.out()));
   if (!bus.connection) {
     // The daemon is ending: somebody who wanted the connection as well has stopped waiting for it.
     if (!error.matches(G_IO_ERROR, G_IO_ERROR_CANCELLED)) {
-      look_again_later(error);
+      retry_later(error);
     }
     return;
   }
@@ -62,8 +62,8 @@ void on_bus(GObject * /*source*/, GAsyncResult *result, gpointer /*user_data*/) 
   }
 }
 
-void look_for_bus() {
-  if (!std::exchange(system_bus().looking, true)) {
+void connect_to_bus() {
+  if (!std::exchange(system_bus().connecting, true)) {
     g_bus_get(G_BUS_TYPE_SYSTEM, nullptr, on_bus, nullptr);
   }
 }
@@ -77,8 +77,8 @@ gboolean on_flush_timeout(gpointer user_data) {
   return G_SOURCE_REMOVE;
 }
 
-// A context of its own: nothing else of the daemon may run any more, and a flush that ends after
-// the timeout finds nobody to report to.
+// A context of its own: nothing else of the daemon may run any more, and the result of a flush that
+// ends after the timeout is discarded.
 void flush(GDBusConnection *connection) {
   const MainContextPtr context(g_main_context_new());
   g_main_context_push_thread_default(context.get());
@@ -98,7 +98,7 @@ void flush(GDBusConnection *connection) {
 
 void system_bus_when_ready(std::function<void(GDBusConnection *)> ready) {
   system_bus().waiting.push_back(std::move(ready));
-  look_for_bus();
+  connect_to_bus();
 }
 
 void system_bus_flush() {

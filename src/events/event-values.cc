@@ -69,7 +69,6 @@ std::string value_text(IOPort *port, const std::string &value, int type) {
 
 bool populate_value(IOPort *port, const IoEventKey &key, Inspectable *inspectable) {
   const int type = key_type(key.type);
-  g_assert(type != 0);
   const std::string text = value_text(port, key.value.value_or(""), type);
   const std::string name = key.name.value_or("");
   if (!inspectable_set_value_as_string(inspectable, name.c_str(), type, text.c_str())) {
@@ -112,7 +111,30 @@ const IoEventKey *property_of(const std::list<IoEventKey> &keys) {
   return found == keys.rend() ? nullptr : &*found;
 }
 
-const char *fault_of(const IoEventKey &key) {
+bool populate_sent_values(IOPort *port, const std::list<IoEventKey> &keys,
+                          Inspectable *inspectable) {
+  return std::all_of(keys.begin(), keys.end(), [&](const IoEventKey &key) {
+    return !key.property || populate_value(port, key, inspectable);
+  });
+}
+
+bool populate_declared_values(IOPort *port, const std::list<IoEventKey> &keys,
+                              Inspectable *inspectable, std::string *property_key_out) {
+  const IoEventKey *property = property_of(keys);
+  for (const auto &key : keys) {
+    if (!populate_nice_names(port, key, inspectable)) {
+      return false;
+    }
+    if (&key == property) {
+      *property_key_out = key.name.value_or("");
+    } else if (!populate_value(port, key, inspectable)) {
+      return false;
+    }
+  }
+  return true;
+}
+
+const char *invalid_reason(const IoEventKey &key) {
   if (!key.name) {
     return "it has no name";
   }
@@ -128,10 +150,10 @@ const char *fault_of(const IoEventKey &key) {
 
 }  // namespace
 
-bool event_keys_are_sound(const IOPort *port, const std::list<IoEventKey> &keys) {
+bool event_keys_are_valid(const IOPort *port, const std::list<IoEventKey> &keys) {
   for (const auto &key : keys) {
-    if (const char *fault = fault_of(key)) {
-      log_warning("Port %s: event key %s is of no use: %s", io_port_describe(port),
+    if (const char *fault = invalid_reason(key)) {
+      log_warning("Port %s: event key %s is invalid: %s", io_port_describe(port),
                   key.name.value_or("").c_str(), fault);
       return false;
     }
@@ -141,20 +163,9 @@ bool event_keys_are_sound(const IOPort *port, const std::list<IoEventKey> &keys)
 
 bool populate_event_values(IOPort *port, const std::list<IoEventKey> &keys,
                            Inspectable *inspectable, bool sending, std::string *property_key_out) {
-  const IoEventKey *property = property_of(keys);
   for (const auto &key : keys) {
     g_assert(key_type(key.type) != 0);
-    if (sending && !key.property) {
-      continue;
-    }
-    if (!sending && !populate_nice_names(port, key, inspectable)) {
-      return false;
-    }
-    if (!sending && &key == property) {
-      *property_key_out = key.name.value_or("");
-    } else if (!populate_value(port, key, inspectable)) {
-      return false;
-    }
   }
-  return true;
+  return sending ? populate_sent_values(port, keys, inspectable)
+                 : populate_declared_values(port, keys, inspectable, property_key_out);
 }

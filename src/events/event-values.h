@@ -11,7 +11,7 @@ struct IoEventKey;
 
 // Whether the description can be populated: every key has a name, a value unless it only marks the
 // property, and a type that goes with them. Says in the log what is wrong. Main thread.
-bool event_keys_are_sound(const IOPort *port, const std::list<IoEventKey> &keys);
+bool event_keys_are_valid(const IOPort *port, const std::list<IoEventKey> &keys);
 
 // Fills `inspectable` from the keys, in list order. While declaring (`sending` false) sets nice
 // names and every value but that of property keys, and stores the name of the last property key in

@@ -167,7 +167,7 @@ bool make_property(EventDeclaration *declaration, const std::string &key) {
 void declare_described(IOPort *port, IoEvent *event) {
   const std::string name = name_of(event);
   const int number = io_port_get_number(port);
-  if (!event_keys_are_sound(port, event->keys)) {
+  if (!event_keys_are_valid(port, event->keys)) {
     return;
   }
   const DeclarationPtr declaration(event_declaration_new_from_type(name.c_str()));
@@ -197,7 +197,7 @@ void declare_described(IOPort *port, IoEvent *event) {
 
 // --- Sending ---
 
-// A supervised event says anew what it said last only when it was told to.
+// A supervised event repeats its last value only after a reset of its filter.
 bool is_repeat(IoEvent *event, std::int32_t value) {
   const bool reset = event->filter_reset.exchange(false);
   const std::int32_t last = event->last_value.exchange(value);

@@ -22,15 +22,15 @@ constexpr const char *kChannelInterface = "com.kelv.Streamer.Video.Channel";
 constexpr const char *kCoordinator = "com.kelv.PTZ.Coordinator";
 constexpr const char *kCoordinatorObject = "/com/kelv/PTZ/Coordinator/1";
 
-// A streamer that has an answer for every path must not be searched for good.
+// Limits the search in a streamer that answers for every path.
 constexpr int kMaxChannels = 1024;
-// A service that has said nothing by then does not answer.
+// After this time a service counts as not answering.
 constexpr gint64 kCallLimitUs = 25'000'000;
 constexpr unsigned kDecimal = 10;
 
 struct Channel {
   int number;
-  bool followed;  // it has said whether it is enabled, so it will say when that changes
+  bool followed;  // has the property "Enabled", so it signals its changes
 };
 
 // One of the two services. An answer, or its absence, counts for the owner that was asked.
@@ -43,18 +43,18 @@ struct Service {
   unsigned owner = 0;  // counts them
 };
 
-// The coordinator's word is needed to judge the first channel, so the streamer is looked at after
-// it, and the word is acted on when all channels are known.
+// The coordinator's state is needed for the first channel, so the streamer is queried after it, and
+// the state is applied when all channels are known.
 enum class Phase { kWaitsForCoordinator, kWaitsForStreamer, kFollowsBoth };
 
 struct Monitors {
   Phase phase = Phase::kWaitsForCoordinator;
   Service coordinator{"PTZ coordinator"};
-  bool ptz_heard = false;  // of this owner, by signal: newer than its answer
-  PtzState ptz_state = PTZ_UNKNOWN;
+  bool ptz_signalled = false;  // of this owner, by signal: newer than its answer
+  PtzState ptz_state = PtzState::kUnknown;
   Service streamer{"Streamer"};
   std::forward_list<Channel> channels;
-  std::map<int, bool> heard;  // by signal, of channels that are not known yet
+  std::map<int, bool> signalled;  // by signal, of channels that are not known yet
 };
 
 // None before the start and after the stop.
@@ -89,16 +89,16 @@ std::optional<bool> cached_boolean(GDBusProxy *proxy, const char *property) {
   return g_variant_get_boolean(value.get());
 }
 
-// What it was asked, and what it says by signal, no longer counts.
-void forget_owner(Service &service) {
+// Pending queries and signals of the earlier owner no longer count.
+void reset_owner(Service &service) {
   service.worker.cancel();
   service.signals.reset();
   ++service.owner;
 }
 
-// Hands an answer to the main loop, which takes it if it comes from the present owner.
-void answer(Service Monitors::*service, unsigned owner, GCancellable *cancellable,
-            std::function<void()> take) {
+// Posts an answer to the main loop, where it counts if it comes from the present owner.
+void post_answer(Service Monitors::*service, unsigned owner, GCancellable *cancellable,
+                 std::function<void()> take) {
   if (g_cancellable_is_cancelled(cancellable)) {
     return;
   }
@@ -150,16 +150,16 @@ void on_enabled_changed(const char *object_path, GVariant *parameters) {
       manual_trigger_set_channel(number, enabled);
     }
   } else {
-    monitors->heard[number] = enabled;
+    monitors->signalled[number] = enabled;
   }
 }
 
-// A signal that came before the answer was not older than it, or says the same.
-void adopt_channel(int number, std::optional<bool> enabled) {
-  const auto heard = monitors->heard.extract(number);
+// A signal that came before the answer is newer, or says the same.
+void add_channel(int number, std::optional<bool> enabled) {
+  const auto signalled = monitors->signalled.extract(number);
   monitors->channels.push_front({number, enabled.has_value()});
-  if (enabled && !heard.empty()) {
-    enabled = heard.mapped();
+  if (enabled && !signalled.empty()) {
+    enabled = signalled.mapped();
   }
   manual_trigger_set_channel(number, enabled.value_or(true));
 }
@@ -169,10 +169,10 @@ void drop_channels() {
     manual_trigger_remove_channel(channel.number);
   }
   monitors->channels.clear();
-  monitors->heard.clear();
+  monitors->signalled.clear();
 }
 
-void streamer_is_known() {
+void on_streamer_known() {
   if (monitors->phase == Phase::kWaitsForStreamer) {
     monitors->phase = Phase::kFollowsBoth;
     manual_trigger_set_ptz(monitors->ptz_state);
@@ -180,7 +180,7 @@ void streamer_is_known() {
 }
 
 // False: there is no such channel.
-bool ask_channel(int number, unsigned owner, GCancellable *cancellable) {
+bool query_channel(int number, unsigned owner, GCancellable *cancellable) {
   const std::string object = std::string(kChannelRoot) + '/' + std::to_string(number);
   const gint64 begun = g_get_monotonic_time();
   const auto proxy = make_proxy(kStreamer, object.c_str(), kChannelInterface, cancellable);
@@ -189,36 +189,36 @@ bool ask_channel(int number, unsigned owner, GCancellable *cancellable) {
   }
   if (!GStrvPtr(g_dbus_proxy_get_cached_property_names(proxy.get()))) {
     if (g_get_monotonic_time() - begun >= kCallLimitUs) {
-      log_warning("The streamer does not answer; its channels wait until it is started anew");
+      log_warning("The streamer does not answer: its channels are ignored until it restarts");
     }
     return false;
   }
   const auto enabled = cached_boolean(proxy.get(), "Enabled");
-  answer(&Monitors::streamer, owner, cancellable, [=] { adopt_channel(number, enabled); });
+  post_answer(&Monitors::streamer, owner, cancellable, [=] { add_channel(number, enabled); });
   return true;
 }
 
 void scan_channels(unsigned owner, GCancellable *cancellable) {
   int number = 1;
-  while (number <= kMaxChannels && ask_channel(number, owner, cancellable)) {
+  while (number <= kMaxChannels && query_channel(number, owner, cancellable)) {
     ++number;
   }
   if (number > kMaxChannels) {
     log_warning("The streamer has too many channels; stopping after channel %d", kMaxChannels);
   }
-  answer(&Monitors::streamer, owner, cancellable, streamer_is_known);
+  post_answer(&Monitors::streamer, owner, cancellable, on_streamer_known);
 }
 
 void on_streamer_owner(GDBusConnection *connection, const std::string &owner) {
   Service &streamer = monitors->streamer;
-  forget_owner(streamer);
+  reset_owner(streamer);
   if (!monitors->channels.empty()) {
-    streamer_is_known();  // as far as it was searched
+    on_streamer_known();  // as far as it was searched
   }
   drop_channels();
   if (owner.empty()) {
     warn_without_bus(connection);
-    streamer_is_known();
+    on_streamer_known();
     return;
   }
   streamer.signals = SignalSubscription(connection, owner, kChannelInterface, "EnabledChanged",
@@ -230,16 +230,16 @@ void on_streamer_owner(GDBusConnection *connection, const std::string &owner) {
 // --- The camera-control coordinator ---
 
 PtzState state_for(bool enabled) {
-  return enabled ? PTZ_ENABLED : PTZ_DISABLED;
+  return enabled ? PtzState::kEnabled : PtzState::kDisabled;
 }
 
-void take_ptz(PtzState state) {
+void set_ptz_state(PtzState state) {
   monitors->ptz_state = state;
   if (monitors->phase == Phase::kFollowsBoth) {
     manual_trigger_set_ptz(state);
     return;
   }
-  manual_trigger_expect_ptz(state);
+  manual_trigger_store_ptz(state);
   if (monitors->phase == Phase::kWaitsForCoordinator) {
     monitors->phase = Phase::kWaitsForStreamer;
     monitors->streamer.watch = std::make_unique<OwnerWatch>(kStreamer, on_streamer_owner);
@@ -254,33 +254,33 @@ void on_ptz_enabled_changed(const char *object_path, GVariant *parameters) {
   gint32 unused = 0;
   gboolean enabled = FALSE;
   g_variant_get(parameters, "(ib)", &unused, &enabled);
-  monitors->ptz_heard = true;
-  take_ptz(state_for(enabled));
+  monitors->ptz_signalled = true;
+  set_ptz_state(state_for(enabled));
 }
 
-void ask_ptz(unsigned owner, GCancellable *cancellable) {
+void query_ptz(unsigned owner, GCancellable *cancellable) {
   const auto proxy = make_proxy(kCoordinator, kCoordinatorObject, kCoordinator, cancellable);
   const auto enabled = proxy ? cached_boolean(proxy.get(), "PTZEnabled") : std::nullopt;
-  answer(&Monitors::coordinator, owner, cancellable, [=] {
-    if (!monitors->ptz_heard) {
-      take_ptz(enabled ? state_for(*enabled) : PTZ_UNKNOWN);
+  post_answer(&Monitors::coordinator, owner, cancellable, [=] {
+    if (!monitors->ptz_signalled) {
+      set_ptz_state(enabled ? state_for(*enabled) : PtzState::kUnknown);
     }
   });
 }
 
 void on_coordinator_owner(GDBusConnection *connection, const std::string &owner) {
   Service &coordinator = monitors->coordinator;
-  forget_owner(coordinator);
-  monitors->ptz_heard = false;
+  reset_owner(coordinator);
+  monitors->ptz_signalled = false;
   if (owner.empty()) {
     warn_without_bus(connection);
-    take_ptz(PTZ_UNKNOWN);
+    set_ptz_state(PtzState::kUnknown);
     return;
   }
   coordinator.signals = SignalSubscription(connection, owner, kCoordinator, "PtzEnabledChanged",
                                            on_ptz_enabled_changed);
   coordinator.worker.queue(
-      [count = coordinator.owner](GCancellable *cancellable) { ask_ptz(count, cancellable); });
+      [count = coordinator.owner](GCancellable *cancellable) { query_ptz(count, cancellable); });
 }
 
 }  // namespace

@@ -2,8 +2,8 @@
 // its manual trigger. Needs a first virtual input in the hardware description; see
 // manual_trigger_configure().
 //
-// Either service is asked on a thread of its own, so one that hangs holds nobody back. A streamer
-// that does not answer within 25 seconds has no channels until it is started anew.
+// Each service is called on a thread of its own. A streamer that does not answer within 25 seconds
+// has no channels until it restarts.
 #pragma once
 
 // Begins to follow what is there, what comes and what goes: the main loop makes the triggers. Does

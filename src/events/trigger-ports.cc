@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <cstdint>
-#include <mutex>
 #include <string>
 #include <utility>
 #include <vector>
@@ -16,11 +15,10 @@ constexpr int kFirstChannel = 1;
 constexpr const char *kEventName = "com.kelv.Event.Pcd.ManualTrigger";
 
 struct Triggers {
-  std::mutex lock;
   bool enabled = false;
   int first_virtual_port = 0;
   std::vector<int> enabled_channels;  // in the order added
-  PtzState ptz_state = PTZ_UNKNOWN;
+  PtzState ptz_state = PtzState::kUnknown;
 };
 
 Triggers &triggers() {
@@ -34,7 +32,6 @@ std::string port_id(int channel) {
 
 // Numbers wrap as those of the hardware description do.
 int port_number(int channel) {
-  const std::lock_guard lock(triggers().lock);
   const auto first = static_cast<std::uint32_t>(triggers().first_virtual_port);
   return static_cast<int>(first + static_cast<std::uint32_t>(channel) - 1U);
 }
@@ -72,7 +69,7 @@ IOPortRef manual_trigger_port_new(int channel) {
 // Without camera control, what a trigger was when it was made is what it stays.
 void manual_trigger_apply(int channel, bool on, PtzState ptz_state) {
   if (const IOPortRef found = port_registry_get_by_id(port_id(channel))) {
-    if (ptz_state != PTZ_DISABLED) {
+    if (ptz_state != PtzState::kDisabled) {
       io_port_set_events_enabled(found.get(), on);
     }
     return;
@@ -82,7 +79,7 @@ void manual_trigger_apply(int channel, bool on, PtzState ptz_state) {
   port_registry_add(made.get());
 }
 
-void note_channel(std::vector<int> &channels, int channel, bool enabled) {
+void mark_channel(std::vector<int> &channels, int channel, bool enabled) {
   const auto place = std::find(channels.begin(), channels.end(), channel);
   if (enabled && place == channels.end()) {
     channels.push_back(channel);
@@ -94,31 +91,25 @@ void note_channel(std::vector<int> &channels, int channel, bool enabled) {
 }  // namespace
 
 void manual_trigger_configure(int first_virtual_port) {
-  const std::lock_guard lock(triggers().lock);
   triggers().enabled = true;
   triggers().first_virtual_port = first_virtual_port;
 }
 
 bool manual_triggers_enabled() {
-  const std::lock_guard lock(triggers().lock);
   return triggers().enabled;
 }
 
 void manual_trigger_set_channel(int channel, bool enabled) {
-  std::unique_lock lock(triggers().lock);
-  note_channel(triggers().enabled_channels, channel, enabled);
+  mark_channel(triggers().enabled_channels, channel, enabled);
   const PtzState ptz_state = triggers().ptz_state;
-  lock.unlock();
-  const bool on = ptz_state == PTZ_DISABLED ? channel == kFirstChannel : enabled;
+  const bool on = ptz_state == PtzState::kDisabled ? channel == kFirstChannel : enabled;
   manual_trigger_apply(channel, on, ptz_state);
 }
 
 void manual_trigger_set_ptz(PtzState state) {
-  std::unique_lock lock(triggers().lock);
   triggers().ptz_state = state;
   const std::vector<int> channels = triggers().enabled_channels;
-  lock.unlock();
-  if (state == PTZ_DISABLED || channels.empty()) {
+  if (state == PtzState::kDisabled || channels.empty()) {
     manual_trigger_set_channel(kFirstChannel, true);
     return;
   }
@@ -127,15 +118,12 @@ void manual_trigger_set_ptz(PtzState state) {
   }
 }
 
-void manual_trigger_expect_ptz(PtzState state) {
-  const std::lock_guard lock(triggers().lock);
+void manual_trigger_store_ptz(PtzState state) {
   triggers().ptz_state = state;
 }
 
 void manual_trigger_remove_channel(int channel) {
-  std::unique_lock lock(triggers().lock);
-  note_channel(triggers().enabled_channels, channel, false);
-  lock.unlock();
+  mark_channel(triggers().enabled_channels, channel, false);
   const IOPortRef port = port_registry_get_by_id(port_id(channel));
   if (!port) {
     return;
@@ -146,10 +134,8 @@ void manual_trigger_remove_channel(int channel) {
 }
 
 void manual_trigger_clear() {
-  std::unique_lock lock(triggers().lock);
   const std::vector<int> channels = std::exchange(triggers().enabled_channels, {});
   const PtzState ptz_state = triggers().ptz_state;
-  lock.unlock();
   for (const int channel : channels) {
     manual_trigger_apply(channel, false, ptz_state);
   }

@@ -2,13 +2,13 @@
 // while the channel, or the lack of camera control, says so. Where the channels come from is the
 // affair of manual-triggers.h.
 //
-// Main thread. The trigger lock is never held while the registry or the port listener is called.
+// Main thread.
 #pragma once
 
-enum PtzState {
-  PTZ_DISABLED = 0,
-  PTZ_ENABLED = 1,
-  PTZ_UNKNOWN = 2,  // no coordinator, or one that does not say
+enum class PtzState {
+  kDisabled = 0,
+  kEnabled = 1,
+  kUnknown = 2,  // no coordinator, or one that does not say
 };
 
 // Wanted from now on. Channel n's port gets the number `first_virtual_port` + n - 1.
@@ -21,7 +21,7 @@ void manual_trigger_set_channel(int channel, bool enabled);
 // the declarations of others that exist already stay.
 void manual_trigger_set_ptz(PtzState state);
 // Stores the state alone, for the channels that are about to be found.
-void manual_trigger_expect_ptz(PtzState state);
+void manual_trigger_store_ptz(PtzState state);
 // The channel is gone: so is its port, and with it a sequence that runs on it.
 void manual_trigger_remove_channel(int channel);
 

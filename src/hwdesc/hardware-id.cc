@@ -5,7 +5,7 @@
 #include "base/glib-ptr.h"
 #include "base/log.h"
 #include "base/main-queue.h"
-#include "base/patience.h"
+#include "base/timeout-budget.h"
 #include "base/worker.h"
 
 namespace {
@@ -19,7 +19,7 @@ using Value = std::optional<std::string>;
 // which takes as long as a call when the service hangs. The worker uses what stands before it.
 struct PolicyService {
   GObjectPtr<GDBusProxy> proxy;
-  Patience patience;
+  TimeoutBudget budget;
   Worker worker{"Hardware id"};
 };
 std::unique_ptr<PolicyService> service;
@@ -31,7 +31,7 @@ void make_proxy(PolicyService &policy, GCancellable *cancellable) {
   policy.proxy.reset(g_dbus_proxy_new_for_bus_sync(G_BUS_TYPE_SYSTEM, G_DBUS_PROXY_FLAGS_NONE,
                                                    nullptr, kService, kObject, kService,
                                                    cancellable, error.out()));
-  policy.patience.spend(g_get_monotonic_time() - begun);
+  policy.budget.spend(g_get_monotonic_time() - begun);
   if (!policy.proxy) {
     log_user("Failed to setup proxy: %s", error.message());
   }
@@ -42,8 +42,8 @@ Value ask(PolicyService &policy, const std::string &parameter, GCancellable *can
   Error error;
   const GVariantPtr reply(g_dbus_proxy_call_sync(
       policy.proxy.get(), "ReadBootblockParam", g_variant_new("(s)", parameter.c_str()),
-      G_DBUS_CALL_FLAGS_NONE, policy.patience.timeout_ms(), cancellable, error.out()));
-  policy.patience.spend(g_get_monotonic_time() - begun);
+      G_DBUS_CALL_FLAGS_NONE, policy.budget.timeout_ms(), cancellable, error.out()));
+  policy.budget.spend(g_get_monotonic_time() - begun);
   if (!reply) {
     log_info("Failed to request policykit system: %s", error.message());
     return std::nullopt;

@@ -6,7 +6,7 @@
 
 // Asks the service for a parameter of the boot block, and waits for the answer while the main
 // loop's sources are served. A service that does not answer holds the caller for 25 seconds, and at
-// later look-ups for 0.1 seconds. None, with a message, when it can't be had. Main thread, at
+// later look-ups for 0.1 seconds. None, with a message, when it is not known. Main thread, at
 // start-up.
 std::optional<std::string> read_hardware_id(const char *parameter);
 

@@ -8,6 +8,7 @@
 #include "hwdesc/hardware-id.h"
 #include "port/ioport.h"
 #include "port/port-registry.h"
+#include "vocabulary/vocabulary.h"
 
 namespace {
 
@@ -27,14 +28,14 @@ using Attributes = std::vector<Attribute>;
 struct Loader {
   bool skip_port = false;                  // until the end tag of the port
   bool in_backend = false;                 // attributes go to the port's backend too
-  std::optional<std::string> hardware_id;  // once it could be had
+  std::optional<std::string> hardware_id;  // once it is known
   bool has_root = false;                   // the outermost element may have any name
 };
 
 std::optional<int> first_virtual_input;
 
-// Something in a document means nothing. What exactly is for a strict reader to tell.
-bool met_oddity = false;
+// Whether a document has elements or attributes without effect. The checker tells which.
+bool has_unknown_content = false;
 
 bool is_true(const char *text) {
   return g_ascii_strcasecmp(text, "true") == 0;
@@ -206,29 +207,28 @@ void open_event(IOPort *port) {
 void open_keyvalue(IOPort *port) {
   auto &events = io_port_events(port);
   if (events.empty()) {
-    log_warning("Port %s: a key stands before any event", io_port_describe(port));
+    log_warning("Port %s: a keyvalue element comes before any event", io_port_describe(port));
     return;
   }
   events.front().keys.emplace_front();
 }
 
+// Which attributes an element has is in the vocabulary.
 struct Element {
   std::string_view name;
   void (*open)(IOPort *port);  // null: nothing is made
   void (*apply)(IOPort *port, const Attribute &attribute);
-  std::string_view attributes;  // that mean something, each between blanks; empty: any may
 };
 
 constexpr Element kElements[] = {
-    {"port", nullptr, apply_port, " hwid name optional "},
-    {"port_type", nullptr, apply_port_type, " type "},
-    {"properties", nullptr, apply_properties, {}},
-    {"port_no", nullptr, apply_port_no, " nbr "},
-    {"param_default_name", nullptr, apply_param_default_name, " input output "},
-    {"backend", nullptr, apply_backend, {}},
-    {"event", open_event, apply_event, " declaration input output supervised_input declare_only "},
-    {"keyvalue", open_keyvalue, apply_keyvalue,
-     " key value type key-nice-name value-nice-name property "},
+    {"port", nullptr, apply_port},
+    {"port_type", nullptr, apply_port_type},
+    {"properties", nullptr, apply_properties},
+    {"port_no", nullptr, apply_port_no},
+    {"param_default_name", nullptr, apply_param_default_name},
+    {"backend", nullptr, apply_backend},
+    {"event", open_event, apply_event},
+    {"keyvalue", open_keyvalue, apply_keyvalue},
 };
 
 const Element *find_element(std::string_view name) {
@@ -240,9 +240,11 @@ const Element *find_element(std::string_view name) {
   return nullptr;
 }
 
-bool means_something(const Element &element, const Attribute &attribute) {
-  const std::string word = " " + std::string(attribute.name) + " ";
-  return element.attributes.empty() || element.attributes.find(word) != std::string_view::npos;
+// A backend takes any attribute.
+bool has_effect(const Element &element, const Attribute &attribute) {
+  const auto *known = vocabulary::find(vocabulary::elements(), element.name);
+  return element.apply == apply_backend || known->any_attribute ||
+         vocabulary::find(known->attributes, attribute.name);
 }
 
 void apply_first_virtual_input(const Attributes &attributes) {
@@ -264,7 +266,7 @@ void apply_element(Loader &loader, const char *name, const Element *element,
   const IOPortRef port = port_registry_nth(0);
   if (!port) {
     if (element) {
-      log_warning("Element %s stands before any port", name);
+      log_warning("Element %s comes before any port", name);
     }
     return;
   }
@@ -278,7 +280,7 @@ void apply_element(Loader &loader, const char *name, const Element *element,
     }
     if (element) {
       element->apply(port.get(), attribute);
-      met_oddity |= !loader.in_backend && !means_something(*element, attribute);
+      has_unknown_content |= !loader.in_backend && !has_effect(*element, attribute);
     }
     if (names_backend(element, attribute)) {
       loader.in_backend = true;
@@ -299,8 +301,8 @@ void start_element(GMarkupParseContext * /*context*/, const gchar *name, const g
     attributes.push_back({*names, *values});
   }
   const std::string_view element = name;
-  const bool known = find_element(element) || element == "first_virtual_input";
-  met_oddity |= !known && !loader.in_backend && loader.has_root;
+  const bool known = vocabulary::find(vocabulary::elements(), element) != nullptr;
+  has_unknown_content |= !known && !loader.in_backend && loader.has_root;
   loader.has_root = true;
   if (element == "port" && !open_port(loader, attributes)) {
     loader.skip_port = true;
@@ -335,8 +337,8 @@ std::string reason_of(const Error &error) {
   return std::string(place_end == message.npos ? message : message.substr(place_end + 2));
 }
 
-// Ending the parse finds what is cut off: a port that is missing without a word would be hard to
-// find. A file without anything in it just says nothing.
+// Ending the parse detects a truncated document, whose missing ports would be hard to notice. An
+// empty file is fine.
 bool parse(const std::string &path, std::string_view text) {
   Loader loader;
   const GMarkupContextPtr context(
@@ -369,7 +371,7 @@ bool hwdesc_load_file(const std::string &path) {
   }
   const GCharPtr text(contents);
   const bool parsed = parse(path, {contents, length});
-  met_oddity |= !parsed;
+  has_unknown_content |= !parsed;
   return parsed;
 }
 
@@ -389,8 +391,8 @@ void hwdesc_load_directory(const std::string &path) {
 }
 
 void hwdesc_finish() {
-  if (met_oddity) {
-    log_warning("Some of the hardware description means nothing: \"portctl check\" tells what");
+  if (has_unknown_content) {
+    log_warning("Parts of the hardware description have no effect: \"portctl check\" lists them");
   }
   release_hardware_id_service();
 }

@@ -1,6 +1,6 @@
 // The two documents that lead the legacy configuration service to the ports: which objects there
-// are, and which parameter is which property. They are compared as text by what reads them, so
-// every blank in them counts.
+// are, and which parameter is which property. Fixed: every
+// blank in them.
 #pragma once
 
 #include <string>

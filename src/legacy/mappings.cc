@@ -34,14 +34,14 @@ std::vector<LegacyPort> legacy_ports() {
   return ports;
 }
 
-bool holds(const char *path, const std::string &text) {
+bool has_contents(const char *path, const std::string &text) {
   const RegularFile file = open_regular_file(path, nullptr);
   return file.fd && static_cast<std::size_t>(file.status.st_size) == text.size() &&
          read_file(file, text.size(), nullptr) == text;
 }
 
 // Whether the error is of a file system or a folder, which the next one need not share.
-bool is_of_the_place(const Error &error) {
+bool is_folder_error(const Error &error) {
   return error.matches(G_FILE_ERROR, G_FILE_ERROR_ACCES) ||
          error.matches(G_FILE_ERROR, G_FILE_ERROR_PERM) ||
          error.matches(G_FILE_ERROR, G_FILE_ERROR_ROFS);
@@ -58,7 +58,7 @@ bool replace(const char *path, const std::string &text) {
   constexpr auto on_storage = static_cast<GFileSetContentsFlags>(G_FILE_SET_CONTENTS_CONSISTENT |
                                                                  G_FILE_SET_CONTENTS_DURABLE);
   constexpr int readable_by_all = 0666;  // as far as the umask lets
-  if (holds(path, text)) {
+  if (has_contents(path, text)) {
     return true;
   }
   const auto size = static_cast<gssize>(text.size());
@@ -72,7 +72,7 @@ bool replace(const char *path, const std::string &text) {
     elsewhere = errno == EXDEV;
     unlink(kTemporary);
   } else {
-    elsewhere = is_of_the_place(error);
+    elsewhere = is_folder_error(error);
   }
   return elsewhere && confutils_set_file_contents_with_sync(path, text.data(), size, nullptr);
 }
@@ -83,7 +83,7 @@ bool has_folder(const char *path) {
 }
 
 void write_files(const std::vector<LegacyPort> &ports) {
-  // A device without the older configuration service has nobody to tell.
+  // A device without the older configuration service needs no files.
   if (!has_folder(kRegistry) && !has_folder(kMappings)) {
     return;
   }
@@ -95,13 +95,13 @@ void write_files(const std::vector<LegacyPort> &ports) {
   }
 }
 
-std::mutex waiting_lock;
-std::vector<LegacyPort> waiting;  // guarded by waiting_lock; the ports of the latest request
+std::mutex pending_lock;
+std::vector<LegacyPort> pending;  // guarded by pending_lock; the ports of the latest request
 
 // On the thread of the storage writer.
-void write_waiting() {
-  std::unique_lock lock(waiting_lock);
-  const std::vector<LegacyPort> ports = waiting;
+void write_pending() {
+  std::unique_lock lock(pending_lock);
+  const std::vector<LegacyPort> ports = pending;
   lock.unlock();
   write_files(ports);
 }
@@ -137,8 +137,8 @@ void legacy_write_mappings() {
 void legacy_request_mappings() {
   std::vector<LegacyPort> ports = legacy_ports();
   {
-    const std::lock_guard lock(waiting_lock);
-    waiting = std::move(ports);
+    const std::lock_guard lock(pending_lock);
+    pending = std::move(ports);
   }
-  storage_writer_ask(write_waiting);
+  storage_writer_request(write_pending);
 }

@@ -49,12 +49,12 @@ void register_or_end(LegacyController &controller, int number, LegacyInterface i
 
 void register_port(LegacyController &controller, const IOPort *port) {
   const int number = io_port_get_number(port);
-  register_or_end(controller, number, LEGACY_INTERFACE_PORT);
+  register_or_end(controller, number, LegacyInterface::kPort);
   if (io_port_get_type(port) != PORT_OUTPUT) {
-    register_or_end(controller, number, LEGACY_INTERFACE_INPUT);
+    register_or_end(controller, number, LegacyInterface::kInput);
   }
   if (io_port_get_type(port) != PORT_INPUT) {
-    register_or_end(controller, number, LEGACY_INTERFACE_OUTPUT);
+    register_or_end(controller, number, LegacyInterface::kOutput);
   }
 }
 
@@ -83,7 +83,7 @@ void write_property(const char *object_path, GVariant *parameters,
 
 }  // namespace
 
-// Older tools hold this document against their own, so its form is fixed.
+// Fixed: the document, to the letter.
 const char *const kLegacyIntrospection =
     "<node>"
     "<interface name='com.kelv.Configuration.Legacy.IOControl1.IOPort'>"
@@ -117,11 +117,12 @@ GDBusNodeInfoPtr legacy_introspection_parse(const char *document) {
 
 bool iocontrol_conf_legacy_dbus_register_object(LegacyController &controller, int number,
                                                 LegacyInterface interface) {
-  constexpr int message_number = 487;  // support staff look messages up by it
+  constexpr int message_number = 487;  // fixed
   Error error;
   const guint id = g_dbus_connection_register_object(
       controller.connection.get(), legacy_object_path(number).c_str(),
-      controller.introspection->interfaces[interface], &kCallbacks, nullptr, nullptr, error.out());
+      controller.introspection->interfaces[static_cast<std::size_t>(interface)], &kCallbacks,
+      nullptr, nullptr, error.out());
   if (id == 0) {
     std::fprintf(stderr, "%s@%d: Error: \"%s\" when registering DBUS object for port %d\n",
                  __func__, message_number, error.message(), number);
@@ -135,7 +136,7 @@ void legacy_register_objects(LegacyController &controller) {
   const int count = hwdesc_first_virtual_input().value_or(kDefaultPorts);
   // The counts are read from the first object, whatever ports there are.
   if (count <= 0 || !port_registry_find(0)) {
-    register_or_end(controller, 0, LEGACY_INTERFACE_PORT);
+    register_or_end(controller, 0, LegacyInterface::kPort);
   }
   for (const int number : numbers_below(count)) {
     if (const IOPortRef port = port_registry_find(static_cast<std::uint32_t>(number))) {
@@ -145,7 +146,7 @@ void legacy_register_objects(LegacyController &controller) {
 }
 
 void unreg_port_objects(LegacyController &controller) {
-  constexpr int message_number = 627;
+  constexpr int message_number = 627;  // fixed
   for (const guint id : controller.object_ids) {
     if (!g_dbus_connection_unregister_object(controller.connection.get(), id)) {
       std::fprintf(stderr, "%s@%d: Failed to unregister object\n", __func__, message_number);

@@ -19,10 +19,10 @@ struct LegacyController {
 };
 
 // Indexes of the interfaces in the introspection data.
-enum LegacyInterface : std::size_t {
-  LEGACY_INTERFACE_PORT = 0,
-  LEGACY_INTERFACE_INPUT = 1,
-  LEGACY_INTERFACE_OUTPUT = 2,
+enum class LegacyInterface : std::size_t {
+  kPort = 0,
+  kInput = 1,
+  kOutput = 2,
 };
 
 // The interfaces of an introspection document. One that can't be parsed ends the daemon.

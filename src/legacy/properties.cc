@@ -317,8 +317,8 @@ LegacyWrite legacy_write_property(const LegacyValue &written, std::function<void
                               : refuse(request, std::string("Unsupported write of property '") +
                                                     written.property_name + "'");
   if (outcome == Outcome::kStore) {
-    // Whoever is answered finds the setting stored, after what the port waits for has answered.
-    io_port_when_settled(port.get(), [port, stored = std::move(stored)] {
+    // The setting is stored before the caller is answered.
+    io_port_when_idle(port.get(), [port, stored = std::move(stored)] {
       param_request_save(port.get(), kSettingsFile, stored);
     });
     return LegacyWrite::kBeingStored;

@@ -1,4 +1,4 @@
-// The kinds of backend that a port can have. Other programs know them by these numbers.
+// The kinds of backend that a port can have. Fixed: the numbers.
 #pragma once
 
 enum BackendKind : int {

@@ -67,7 +67,7 @@ void io_port_redeclare_events_locked(IOPort *port) {
   }
 }
 
-// In between, the event of a step would be sent to nobody.
+// Under the lock: in between, the event of a step would be lost.
 void io_port_redeclare_events(IOPort *port) {
   const std::lock_guard lock(port->lock);
   io_port_redeclare_events_locked(port);

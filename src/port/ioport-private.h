@@ -25,7 +25,7 @@ struct BackendProperty {
 struct BackgroundWork {
   struct Waiting {
     std::uint64_t until;  // how many must have ended
-    std::function<void()> settled;
+    std::function<void()> done;
   };
 
   std::mutex lock;  // for the rest; nothing else is locked while it is held
@@ -99,7 +99,7 @@ struct IOPort {
 
 // Waits until what was begun in the background for the port so far has ended. False: the port's
 // sequence was cancelled meanwhile. Action threads, without any lock.
-bool io_port_settle_or_cancel(IOPort *port);
+bool io_port_wait_until_idle(IOPort *port);
 // Wakes who waits there, once `cancel_sequence` is set.
 void io_port_cancel_wait(IOPort *port);
 
@@ -117,7 +117,7 @@ void io_port_destroy(IOPort *port);
 
 // Sends those events of the port that apply to its role, while its events are enabled.
 void io_port_fire_events(IOPort *port, std::int32_t state);
-// The same where the state of the line is known apart: events for supervised inputs are told that.
+// The same with the state of the line, which events for supervised inputs are sent with.
 void io_port_fire_line_events(IOPort *port, std::int32_t state, std::int32_t line);
 void io_port_undeclare_events(IOPort *port);
 // As io_port_redeclare_events. The caller holds the port's lock.

@@ -17,11 +17,11 @@ namespace {
 
 constexpr const char *kThreadName = "Action thread";
 
-// After so many steps the thread waits until those who are told of them have kept up, so that
-// neither their memory nor the answers to others suffer from a sequence without pauses.
-constexpr int kStepsAhead = 64;
-// How late that may make a step: an output must not be held on for long by a bus that hangs.
-constexpr std::int64_t kLongestDelay = 1'000'000;  // microseconds
+// After so many steps the thread waits until their signals have been sent, so that a sequence
+// without pauses fills neither the memory nor the queue of the bus.
+constexpr int kMaxUnsentSteps = 64;
+// How late that may make a step when the bus hangs.
+constexpr std::int64_t kMaxDelay = 1'000'000;  // microseconds
 
 struct ActionJob {
   IOPortRef port;
@@ -34,12 +34,12 @@ std::mutex threads_lock;
 MonotonicCondition threads_gone;
 int threads_alive = 0;
 
-void thread_begins() {
+void thread_started() {
   const std::lock_guard lock(threads_lock);
   ++threads_alive;
 }
 
-void thread_ends() {
+void thread_ended() {
   const std::lock_guard lock(threads_lock);
   --threads_alive;
   threads_gone.notify_all();
@@ -51,7 +51,7 @@ bool can_run(const IOPort *port, const ActionSequence &sequence) {
 }
 
 // What ends the waits of the sequence that may begin now. Null: one runs already.
-GObjectPtr<GCancellable> claim(IOPort *port) {
+GObjectPtr<GCancellable> begin_sequence(IOPort *port) {
   const std::lock_guard lock(port->sequence_lock);
   if (port->sequence_running) {
     return nullptr;
@@ -63,7 +63,7 @@ GObjectPtr<GCancellable> claim(IOPort *port) {
       static_cast<GCancellable *>(g_object_ref(port->sequence_cancelled.get())));
 }
 
-// The product wraps in 32 bits: times above 2,147,483 ms have always behaved that way.
+// Fixed: the product wraps in 32 bits.
 std::int64_t deadline_after(std::int32_t time_ms) {
   const auto wrapped = static_cast<std::int32_t>(static_cast<std::uint32_t>(time_ms) * 1000U);
   return g_get_monotonic_time() + wrapped;
@@ -78,7 +78,7 @@ bool hold(IOPort *port, std::int64_t deadline) {
   return !port->cancel_sequence;
 }
 
-void take_step(IOPort *port, bool is_virtual, bool state) {
+void apply_step(IOPort *port, bool is_virtual, bool state) {
   const std::lock_guard lock(port->lock);
   if (is_virtual) {
     io_port_set_virtual(port, state);
@@ -102,24 +102,24 @@ void announce_end(IOPort *port) {
 
 void wait_until_sent(GCancellable *cancelled, std::int64_t step_deadline) {
   if (const auto wait = port_listener().wait_until_sent) {
-    wait(cancelled, std::max(step_deadline, g_get_monotonic_time() + kLongestDelay));
+    wait(cancelled, std::max(step_deadline, g_get_monotonic_time() + kMaxDelay));
   }
 }
 
 void run_steps(const ActionJob &job) {
   IOPort *port = job.port.get();
-  int steps_ahead = 0;
+  int unsent_steps = 0;
   for (const auto &step : job.sequence.steps) {
-    take_step(port, job.sequence.is_virtual, step.state);
-    // A step's time begins when the port has the state. That is waited for without the lock, so
-    // that nobody else waits along.
-    if (!io_port_settle_or_cancel(port)) {
+    apply_step(port, job.sequence.is_virtual, step.state);
+    // A step's time begins when the port has the state. That is waited for without a
+    // lock.
+    if (!io_port_wait_until_idle(port)) {
       return;
     }
     const std::int64_t deadline = deadline_after(step.time_ms);
-    if (++steps_ahead == kStepsAhead) {
+    if (++unsent_steps == kMaxUnsentSteps) {
       wait_until_sent(job.cancelled.get(), deadline);
-      steps_ahead = 0;
+      unsent_steps = 0;
     }
     if (!hold(port, deadline)) {
       return;
@@ -127,9 +127,8 @@ void run_steps(const ActionJob &job) {
   }
 }
 
-// The message that asked for a long sequence, and its steps, leave a hole in every heap that the
-// allocator would keep.
-void give_memory_back(std::size_t steps) {
+// The allocator would keep the memory of a long sequence and of the message that it came with.
+void trim_heap(std::size_t steps) {
 #ifdef __GLIBC__
   constexpr std::size_t many = 1024;
   if (steps > many) {
@@ -149,8 +148,8 @@ gpointer run_sequence(gpointer data) {
     announce_end(job->port.get());
     release(job->port.get());
   }
-  give_memory_back(steps);
-  thread_ends();
+  trim_heap(steps);
+  thread_ended();
   return nullptr;
 }
 
@@ -158,12 +157,12 @@ bool start_thread(IOPort *port, GObjectPtr<GCancellable> cancelled, ActionSequen
   io_port_ref(port);
   auto job = std::make_unique<ActionJob>(
       ActionJob{IOPortRef(port), std::move(cancelled), std::move(sequence)});
-  thread_begins();
+  thread_started();
   Error error;
   GThread *thread = g_thread_try_new(kThreadName, run_sequence, job.get(), error.out());
   if (!thread) {
     log_warning("Could not start action thread: %s", error.message());
-    thread_ends();
+    thread_ended();
     release(port);
     return false;
   }
@@ -176,7 +175,7 @@ bool start_thread(IOPort *port, GObjectPtr<GCancellable> cancelled, ActionSequen
 
 bool io_port_run_action_sequence(IOPort *port, ActionSequence sequence) {
   assert_port(port);
-  auto cancelled = can_run(port, sequence) ? claim(port) : nullptr;
+  auto cancelled = can_run(port, sequence) ? begin_sequence(port) : nullptr;
   if (!cancelled) {
     log_warning("Set action seq on incorrect port");
     return false;

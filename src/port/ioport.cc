@@ -114,10 +114,6 @@ void io_port_set_backend(IOPort *port, BackendKind kind) {
   make_record(port);
 }
 
-BackendKind io_port_get_backend(const IOPort *port) {
-  return port->backend;
-}
-
 bool io_port_has_backend(const IOPort *port) {
   return port->functions != nullptr;
 }
@@ -125,7 +121,7 @@ bool io_port_has_backend(const IOPort *port) {
 void io_port_set_backend_property(IOPort *port, const char *section, const char *key,
                                   const char *value) {
   if (!port->functions) {
-    log_warning("Port %s has no backend to set %s %s of", io_port_describe(port), section, key);
+    log_warning("Port %s has no backend: %s %s is ignored", io_port_describe(port), section, key);
     return;
   }
   port->backend_properties.push_back({section, key, value});
@@ -154,12 +150,12 @@ bool io_port_setup(IOPort *port) {
   if (io_port_begin_setup(port)) {
     return true;
   }
-  bool settled = false;
-  io_port_when_settled(port, [&] { settled = true; });
-  if (settled) {
+  bool idle = false;
+  io_port_when_idle(port, [&] { idle = true; });
+  if (idle) {
     return false;  // nothing is under way
   }
-  serve_main_loop_until([&] { return settled; });
+  serve_main_loop_until([&] { return idle; });
   return port->set_up;
 }
 

@@ -57,7 +57,6 @@ std::optional<BackendKind> io_port_backend_kind(std::string_view word);
 // Chooses the backend, and gives the port its private record if it has none. A kind that nobody
 // registered leaves the port without a table.
 void io_port_set_backend(IOPort *port, BackendKind kind);
-BackendKind io_port_get_backend(const IOPort *port);
 // Whether the port has a table. The operations that say "needs a backend" may be called only then.
 bool io_port_has_backend(const IOPort *port);
 // Hands an attribute of the hardware description to the backend. Without a backend it is lost, with
@@ -70,7 +69,7 @@ PortBackendData *io_port_backend_data(const IOPort *port);
 
 // Brings the backend up; needs a backend. A port that was dropped gets a fresh backend first, with
 // the attributes of the hardware description. False: it does not come up, or it has to wait for a
-// service first; once io_port_when_settled() calls, io_port_is_set_up() tells.
+// service first; once io_port_when_idle() calls, io_port_is_set_up() tells.
 bool io_port_begin_setup(IOPort *port);
 // The same for who needs the outcome at once: serves the main loop's sources until the port has
 // settled.
@@ -157,13 +156,13 @@ bool io_port_set_virtual(IOPort *port, bool state);
 void io_port_report_state(IOPort *port, std::int32_t state);
 // Emits PortChanged while the port's events are enabled. Any thread.
 void io_port_send_signal(IOPort *port, bool virtual_change, bool state);
-// The same for an input whose backend knows the state of the line apart from the level: events for
-// supervised inputs are told the line, all others, and PortChanged, the logical state.
+// The same for an input whose backend knows the state of the line as well as the level: events for
+// supervised inputs carry the state of the line, all others, and PortChanged, the logical state.
 void io_port_report_line(IOPort *port, SupervisedRangeState line);
-// Calls `settled` when a service that the port depends on has answered, or failed to answer, what
+// Calls `done` when a service that the port depends on has answered, or failed to answer, what
 // was asked of it for the port so far: at once when nothing is under way, else from the main loop.
 // Nobody waits meanwhile, and the port can be used.
-void io_port_when_settled(IOPort *port, std::function<void()> settled);
+void io_port_when_idle(IOPort *port, std::function<void()> done);
 // Arms the backend's watch while the port acts as an input and its events are enabled. Needs a
 // backend.
 void io_port_set_watch(IOPort *port);
@@ -223,7 +222,7 @@ SupervisedRangeState io_port_get_supervised_state(IOPort *port);
 
 // --- Events -------------------------------------------------------------------------------------
 
-// The port's events, newest first, for whoever declares and fills them.
+// The port's events, newest first.
 IoEvents &io_port_events(IOPort *port);
 // Whether the event is for the role that the port has now. Any thread.
 bool io_port_event_applies(const IOPort *port, const IoEvent &event);

@@ -43,7 +43,7 @@ struct PortFunctions {
   // Also from action threads. Null: no port of the backend is.
   bool (*is_supervisable)(IOPort *port) = nullptr;
   bool (*set_supervised)(IOPort *port, bool supervised) = nullptr;
-  // Also from action threads. Null: there are none to be had.
+  // Also from action threads. Null: there are none.
   SupervisedRanges (*get_supervised_ranges)(IOPort *port) = nullptr;
   // Takes the list over, or refuses it and sets `error`. Null: refuses it, without an error.
   bool (*set_supervised_ranges)(IOPort *port, SupervisedRanges ranges, GError **error) = nullptr;
@@ -64,7 +64,7 @@ struct PortFunctions {
                        const char *value) = nullptr;
   // Releases what the record holds while its port is out of service, and once more before the
   // record is destroyed. Null: the record is destroyed when the port is dropped; the next set-up
-  // gets a new one that was told the attributes again.
+  // gets a new one, with the attributes set again.
   void (*drop)(IOPort *port) = nullptr;
 };
 

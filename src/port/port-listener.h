@@ -1,5 +1,5 @@
-// What the port layer tells the world above it. The event code and the D-Bus interfaces fill their
-// slots at start-up; an empty slot means "not up yet" and is skipped without a word.
+// The callbacks of the port layer to the layers above. The event code and the D-Bus interfaces fill
+// their slots at start-up; an empty slot is skipped.
 #pragma once
 
 #include <gio/gio.h>

@@ -1,4 +1,4 @@
-// What a port may be called, whoever says so. Any thread.
+// Which names a port may have. Any thread.
 #pragma once
 
 #include <glib.h>

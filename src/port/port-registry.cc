@@ -30,18 +30,18 @@ IOPortRef new_reference(IOPort *port) {
   return IOPortRef(port);
 }
 
-bool takes_part(const IOPort *port) {
+bool is_addressable(const IOPort *port) {
   return io_port_is_ioport(port) || io_port_get_flag(port, "virtual");
 }
 
 IOPortRef find_in(const Ports &ports, std::uint32_t number) {
   const auto found = std::find_if(ports.rbegin(), ports.rend(), [&](const IOPort *port) {
-    return std::cmp_equal(port->number, number) && takes_part(port);
+    return std::cmp_equal(port->number, number) && is_addressable(port);
   });
   return found == ports.rend() ? nullptr : new_reference(*found);
 }
 
-void put_in_front(Ports &ports, IOPort *port) {
+void prepend(Ports &ports, IOPort *port) {
   ports.insert(ports.begin(), port);
 }
 
@@ -72,7 +72,7 @@ std::size_t move_ports(Ports &from, Ports &to, Predicate moves) {
   std::size_t moved = 0;
   for (IOPort *port : std::exchange(from, {})) {
     if (moves(port)) {
-      put_in_front(to, port);
+      prepend(to, port);
       ++moved;
     } else {
       stay.push_back(port);
@@ -97,17 +97,17 @@ std::vector<IOPortRef> snapshot_with_backend() {
   return ports;
 }
 
-void when_all_settled(const std::vector<IOPortRef> &ports, std::function<void()> done) {
+void when_all_idle(const std::vector<IOPortRef> &ports, std::function<void()> done) {
   const auto left = std::make_shared<std::size_t>(ports.size() + 1);
-  const auto one_settled = [left, done = std::move(done)] {
+  const auto one_idle = [left, done = std::move(done)] {
     if (--*left == 0) {
       done();
     }
   };
   for (const auto &port : ports) {
-    io_port_when_settled(port.get(), one_settled);
+    io_port_when_idle(port.get(), one_idle);
   }
-  one_settled();
+  one_idle();
 }
 
 // Sets up the ports of a list, without the lock: a backend may declare events, whose library may
@@ -117,7 +117,7 @@ void set_up_all(const Ports &list, std::function<void()> done) {
   for (const auto &port : ports) {
     set_up(port.get());
   }
-  when_all_settled(ports, std::move(done));
+  when_all_idle(ports, std::move(done));
 }
 
 // Who asked for the parked ports to be tried, and whether a pass is under way. Main thread.
@@ -131,7 +131,7 @@ Retries &retries() {
   return instance;
 }
 
-std::size_t bring_back() {
+std::size_t unpark_set_up() {
   const std::lock_guard lock(registry().lock);
   return move_ports(registry().parked, registry().active,
                     [](const IOPort *port) { return port->set_up.load(); });
@@ -142,7 +142,7 @@ void retry_parked() {
   retries().running = true;
   set_up_all(registry().parked, [callers] {
     retries().running = false;
-    const std::size_t count = bring_back();
+    const std::size_t count = unpark_set_up();
     for (const auto &done : callers) {
       done(count);
     }
@@ -195,7 +195,7 @@ void assign_default_name(IOPort *port, NameCounters &seen) {
 void port_registry_add(IOPort *port) {
   const std::lock_guard lock(registry().lock);
   io_port_ref(port);
-  put_in_front(registry().active, port);
+  prepend(registry().active, port);
 }
 
 IOPortRef port_registry_nth(std::size_t n) {
@@ -285,9 +285,9 @@ void port_registry_assign_default_names() {
 }
 
 void port_registry_setup_all() {
-  bool settled = false;
-  set_up_all(registry().active, [&] { settled = true; });
-  serve_main_loop_until([&] { return settled; });
+  bool idle = false;
+  set_up_all(registry().active, [&] { idle = true; });
+  serve_main_loop_until([&] { return idle; });
   const std::lock_guard lock(registry().lock);
   move_ports(registry().active, registry().parked,
              [](const IOPort *port) { return port->optional && !port->set_up; });
@@ -303,7 +303,7 @@ void port_registry_retry_parked(std::function<void(std::size_t)> done) {
 void port_registry_park(IOPort *port) {
   const std::lock_guard lock(registry().lock);
   if (port->optional && std::erase(registry().active, port) > 0) {
-    put_in_front(registry().parked, port);
+    prepend(registry().parked, port);
   }
 }
 

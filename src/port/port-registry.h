@@ -45,7 +45,7 @@ void port_registry_for_each(const std::function<void(IOPort *)> &visit);
 void port_registry_assign_default_names();
 // Sets up every port. An optional port that fails is parked. Neither pass holds the lock while it
 // calls a backend. This one serves the main loop's sources while ports wait for a service, so it is
-// for start-up; the other one waits for nobody.
+// for start-up; the other one does not wait.
 void port_registry_setup_all();
 // Tries the parked ports again and calls `done` with the number that came back, when the last of
 // them has settled. What is asked for during a pass begins with the next one.

@@ -20,7 +20,7 @@ std::vector<std::function<void()>> take_due(BackgroundWork &work) {
       work.waiting.begin(), work.waiting.end(),
       [&](const BackgroundWork::Waiting &waiting) { return waiting.until > work.ended; });
   for (auto waiting = work.waiting.begin(); waiting != first_left; ++waiting) {
-    due.push_back(std::move(waiting->settled));
+    due.push_back(std::move(waiting->done));
   }
   work.waiting.erase(work.waiting.begin(), first_left);
   return due;
@@ -43,24 +43,24 @@ PortWork::~PortWork() {
   lock.unlock();
   // The reference goes there too: it may be the last one, and ports are freed on the main thread.
   post_to_main_loop([port = std::shared_ptr<IOPort>(std::move(port_)), due = std::move(due)] {
-    for (const auto &settled : due) {
-      settled();
+    for (const auto &done : due) {
+      done();
     }
   });
 }
 
-void io_port_when_settled(IOPort *port, std::function<void()> settled) {
+void io_port_when_idle(IOPort *port, std::function<void()> done) {
   BackgroundWork &work = port->background;
   std::unique_lock lock(work.lock);
   if (work.ended < work.begun) {
-    work.waiting.push_back({work.begun, std::move(settled)});
+    work.waiting.push_back({work.begun, std::move(done)});
     return;
   }
   lock.unlock();
-  settled();
+  done();
 }
 
-bool io_port_settle_or_cancel(IOPort *port) {
+bool io_port_wait_until_idle(IOPort *port) {
   BackgroundWork &work = port->background;
   std::unique_lock lock(work.lock);
   const std::uint64_t until = work.begun;

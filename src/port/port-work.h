@@ -1,7 +1,7 @@
 // What a backend does for a port in the background, because it has to wait for a service.
 //
 // A piece of work lasts from the construction of its PortWork to its destruction, and keeps the
-// port alive for that long. io_port_when_settled() waits for its end.
+// port alive for that long. io_port_when_idle() waits for its end.
 #pragma once
 
 #include "port/ioport.h"

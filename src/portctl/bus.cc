@@ -24,31 +24,31 @@ constexpr const char *kStartIt =
     "\"journalctl -u portd\" for why it ended";
 
 constexpr Advice kAdvice[] = {
-    {"org.freedesktop.DBus.Error.AccessDenied", kNotAllowed,
+    {"org.freedesktop.DBus.Error.AccessDenied", STATUS_NOT_ALLOWED,
      "not allowed: ask for membership of the group portd, or do it as root"},
-    {"org.freedesktop.DBus.Error.ServiceUnknown", kNoDaemon, kStartIt},
-    {"org.freedesktop.DBus.Error.NameHasNoOwner", kNoDaemon, kStartIt},
-    {"org.freedesktop.DBus.Error.Spawn.ChildExited", kNoDaemon, kStartIt},
-    {"org.freedesktop.DBus.Error.Spawn.Failed", kNoDaemon, kStartIt},
-    {"org.freedesktop.systemd1.NoSuchUnit", kNoDaemon, kStartIt},
-    {"org.freedesktop.DBus.Error.UnknownMethod", kNoDaemon,
+    {"org.freedesktop.DBus.Error.ServiceUnknown", STATUS_NO_DAEMON, kStartIt},
+    {"org.freedesktop.DBus.Error.NameHasNoOwner", STATUS_NO_DAEMON, kStartIt},
+    {"org.freedesktop.DBus.Error.Spawn.ChildExited", STATUS_NO_DAEMON, kStartIt},
+    {"org.freedesktop.DBus.Error.Spawn.Failed", STATUS_NO_DAEMON, kStartIt},
+    {"org.freedesktop.systemd1.NoSuchUnit", STATUS_NO_DAEMON, kStartIt},
+    {"org.freedesktop.DBus.Error.UnknownMethod", STATUS_NO_DAEMON,
      "the daemon does not serve this (yet): try again when it has started, or update it"},
-    {"org.freedesktop.DBus.Error.NoReply", kNoDaemon,
+    {"org.freedesktop.DBus.Error.NoReply", STATUS_NO_DAEMON,
      "the daemon ended or does not answer: see \"systemctl status portd\""},
-    {"com.kelv.IOControl.Error.No_port", kNoPort,
+    {"com.kelv.IOControl.Error.No_port", STATUS_NO_PORT,
      "there is no such I/O port: \"portctl list\" shows those in service"},
-    {"com.kelv.IOSupervised.Error.No_port", kNoPort,
+    {"com.kelv.IOSupervised.Error.No_port", STATUS_NO_PORT,
      "there is no such I/O port: \"portctl list\" shows those in service"},
-    {"com.kelv.IOControl.Error.Busy", kRefused,
+    {"com.kelv.IOControl.Error.Busy", STATUS_REFUSED,
      "a sequence runs on it: try again when it has ended (\"portctl monitor\" shows the end)"},
-    {"com.kelv.IOControl.Error.Not_output", kRefused,
+    {"com.kelv.IOControl.Error.Not_output", STATUS_REFUSED,
      "it can't be driven now: it is an input, or its hardware is missing. \"portctl direction PORT "
      "output\" turns a configurable one, \"portctl virtual\" reports a state without driving it"},
-    {"com.kelv.IOControl.Error.Not_configurable", kRefused,
+    {"com.kelv.IOControl.Error.Not_configurable", STATUS_REFUSED,
      "its direction is fixed: only ports that \"portctl list\" calls configurable can be turned"},
-    {"com.kelv.IOSupervised.Not_supervisable", kRefused,
+    {"com.kelv.IOSupervised.Not_supervisable", STATUS_REFUSED,
      "it can't be supervised: \"portctl supervised\" lists those that can"},
-    {"com.kelv.IOSupervised.Bad_supervised_range", kRefused,
+    {"com.kelv.IOSupervised.Bad_supervised_range", STATUS_REFUSED,
      "the range is not taken: a state (open, closed, short, cut), then lower < upper, both below "
      "65536"},
 };
@@ -77,7 +77,7 @@ GDBusConnection *connect(const std::string &address, Error &error) {
 
 void on_closed(GDBusConnection * /*connection*/, gboolean /*by_remote*/, GError * /*error*/,
                gpointer /*data*/) {
-  fail(kNoDaemon, "the bus has gone");
+  fail(STATUS_NO_DAEMON, "the bus has gone");
 }
 
 }  // namespace
@@ -93,14 +93,15 @@ Failure explain(const Error &error, const std::string &what) {
   const std::string subject = what.empty() ? "" : visible(what) + ": ";
   for (const auto &advice : kAdvice) {
     if (advice.name == name) {
-      const bool absent = advice.status == kNoDaemon;
+      const bool absent = advice.status == STATUS_NO_DAEMON;
       return {advice.status, (absent ? "" : subject) + advice.text};
     }
   }
   if (error.matches(G_IO_ERROR, G_IO_ERROR_TIMED_OUT)) {
-    return {kNoDaemon, subject + "the daemon does not answer: see \"systemctl status portd\""};
+    return {STATUS_NO_DAEMON,
+            subject + "the daemon does not answer: see \"systemctl status portd\""};
   }
-  return {kRefused, subject + remote_message(error)};
+  return {STATUS_REFUSED, subject + remote_message(error)};
 }
 
 void fail_call(const Error &error, const std::string &what) {
@@ -109,7 +110,7 @@ void fail_call(const Error &error, const std::string &what) {
 }
 
 bool is_absence(const Error &error) {
-  return error && explain(error, "").status == kNoDaemon;
+  return error && explain(error, "").status == STATUS_NO_DAEMON;
 }
 
 GDBusConnection *Bus::connection() {
@@ -117,9 +118,9 @@ GDBusConnection *Bus::connection() {
     Error error;
     connection_.reset(connect(address_, error));
     if (!connection_) {
-      fail(kNoDaemon, std::string("no connection to the ") +
-                          (address_.empty() ? "system bus" : "bus at the given address") + ": " +
-                          visible(error.message()));
+      fail(STATUS_NO_DAEMON, std::string("no connection to the ") +
+                                 (address_.empty() ? "system bus" : "bus at the given address") +
+                                 ": " + visible(error.message()));
     }
     g_dbus_connection_set_exit_on_close(connection_.get(), FALSE);
     g_signal_connect(connection_.get(), "closed", G_CALLBACK(on_closed), nullptr);

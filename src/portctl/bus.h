@@ -13,15 +13,15 @@
 #include "iosupervised-supervised-gen.h"
 #include "pcd-connector-gen.h"
 
-// Documented in portctl(1): scripts rely on the numbers.
+// Fixed: the numbers, see portctl(1).
 enum Status {
-  kOk = 0,
-  kRefused = 1,     // the daemon said no, or a checked file has mistakes
-  kUsage = 2,       // the command line makes no sense
-  kNoPort = 3,      // no port, or several, fit the given word
-  kNotAllowed = 4,  // the bus policy keeps this account from changing ports
-  kNoDaemon = 5,    // no bus, or no daemon on it
-  kTimeout = 6,     // what was waited for did not come in time
+  STATUS_OK = 0,
+  STATUS_REFUSED = 1,      // the daemon said no, or a checked file has mistakes
+  STATUS_USAGE = 2,        // the command line makes no sense
+  STATUS_NO_PORT = 3,      // no port, or several, fit the given word
+  STATUS_NOT_ALLOWED = 4,  // the bus policy keeps this account from changing ports
+  STATUS_NO_DAEMON = 5,    // no bus, or no daemon on it
+  STATUS_TIMEOUT = 6,      // what was waited for did not come in time
 };
 
 inline constexpr const char *kControlName = "com.kelv.IOControl.State";

@@ -63,7 +63,8 @@ const char *active_word(const std::string &word) {
   if (word == "closed" || word == "high") {
     return "closed";
   }
-  fail(kUsage, "\"" + visible(word) + "\" is no active level: give low (open) or high (closed)");
+  fail(STATUS_USAGE,
+       "\"" + visible(word) + "\" is no active level: give low (open) or high (closed)");
 }
 
 void set_state(Session &session, const std::string &word, std::uint32_t number, bool active) {
@@ -86,13 +87,14 @@ bool parse_state(const std::string &word) {
       return false;
     }
   }
-  fail(kUsage, "\"" + visible(word) + "\" is no state: give active or inactive (on, off, 1, 0)");
+  fail(STATUS_USAGE,
+       "\"" + visible(word) + "\" is no state: give active or inactive (on, off, 1, 0)");
 }
 
 int set_command(Session &session) {
   const bool active = parse_state(session.words[1]);
   set_state(session, session.words[0], port_number(session.bus, session.words[0]), active);
-  return kOk;
+  return STATUS_OK;
 }
 
 int toggle_command(Session &session) {
@@ -105,7 +107,7 @@ int toggle_command(Session &session) {
         error, word);
   set_state(session, word, number, !active);
   std::puts(active ? "inactive" : "active");
-  return kOk;
+  return STATUS_OK;
 }
 
 int virtual_command(Session &session) {
@@ -115,13 +117,14 @@ int virtual_command(Session &session) {
   check(iocontrol_state_call_set_virtual_sync(session.bus.control(), number, active, nullptr,
                                               error.out()),
         error, session.words[0]);
-  return kOk;
+  return STATUS_OK;
 }
 
 int direction_command(Session &session) {
   const std::string &word = session.words[0];
   if (session.words.size() > 1 && session.words[1] != "input" && session.words[1] != "output") {
-    fail(kUsage, "\"" + visible(session.words[1]) + "\" is no direction: give input or output");
+    fail(STATUS_USAGE,
+         "\"" + visible(session.words[1]) + "\" is no direction: give input or output");
   }
   const std::uint32_t number = port_number(session.bus, word);
   Error error;
@@ -129,7 +132,7 @@ int direction_command(Session &session) {
     check(iocontrol_state_call_set_direction_sync(session.bus.control(), number,
                                                   session.words[1].c_str(), nullptr, error.out()),
           error, word);
-    return kOk;
+    return STATUS_OK;
   }
   char *direction = nullptr;
   check(iocontrol_state_call_get_direction_sync(session.bus.control(), number, &direction, nullptr,
@@ -142,7 +145,7 @@ int direction_command(Session &session) {
   } else {
     std::puts(visible(direction).c_str());
   }
-  return kOk;
+  return STATUS_OK;
 }
 
 int name_command(Session &session) {
@@ -150,17 +153,17 @@ int name_command(Session &session) {
   const std::uint32_t number = port_number(session.bus, word);
   if (session.words.size() == 1) {
     print_names(session, number);
-    return kOk;
+    return STATUS_OK;
   }
   const std::string &name = session.words[1];
   if (!g_utf8_validate(name.c_str(), -1, nullptr)) {
-    fail(kUsage, "the name is not UTF-8: it could not be sent to the daemon");
+    fail(STATUS_USAGE, "the name is not UTF-8: it could not be sent to the daemon");
   }
   Error error;
   check(iocontrol_state_call_set_name_sync(session.bus.control(), number, input_side(session, word),
                                            name.c_str(), nullptr, error.out()),
         error, word);
-  return kOk;
+  return STATUS_OK;
 }
 
 int active_command(Session &session) {
@@ -169,13 +172,13 @@ int active_command(Session &session) {
   const std::uint32_t number = port_number(session.bus, word);
   if (!level) {
     print_active(session, number);
-    return kOk;
+    return STATUS_OK;
   }
   Error error;
   check(iocontrol_state_call_set_active_sync(
             session.bus.control(), number, input_side(session, word), level, nullptr, error.out()),
         error, word);
-  return kOk;
+  return STATUS_OK;
 }
 
 int drop_command(Session &session) {
@@ -200,12 +203,12 @@ int drop_command(Session &session) {
   const GStrvPtr owned(dropped);
   for (const auto &id : ids) {
     if (!g_strv_contains(dropped, id.c_str())) {
-      fail(kRefused, visible(id) +
-                         " stays in service: only ports that the hardware description "
-                         "marks optional=\"true\" can be dropped");
+      fail(STATUS_REFUSED, visible(id) +
+                               " stays in service: only ports that the hardware description "
+                               "marks optional=\"true\" can be dropped");
     }
   }
-  return kOk;
+  return STATUS_OK;
 }
 
 int refresh_command(Session &session) {
@@ -217,5 +220,5 @@ int refresh_command(Session &session) {
   const auto after = fetch_ports(session.bus).size();
   std::printf("%zu ports came back, %zu are in service\n", after > before ? after - before : 0,
               after);
-  return kOk;
+  return STATUS_OK;
 }

@@ -55,10 +55,10 @@ bool Follower::fetch() {
   return ports.has_value();
 }
 
-void Follower::come_up() {
+void Follower::connect_daemon() {
   if (!fetch()) {
     if (retry_ == 0) {
-      retry_ = g_timeout_add(kRetryMs, try_again, this);
+      retry_ = g_timeout_add(kRetryMs, on_retry, this);
     }
     return;
   }
@@ -66,16 +66,16 @@ void Follower::come_up() {
   on_up();
 }
 
-gboolean Follower::try_again(gpointer data) {
+gboolean Follower::on_retry(gpointer data) {
   auto &self = *static_cast<Follower *>(data);
   self.retry_ = 0;
-  self.come_up();
+  self.connect_daemon();
   return G_SOURCE_REMOVE;
 }
 
 void Follower::appeared(GDBusConnection * /*connection*/, const char * /*name*/,
                         const char * /*owner*/, gpointer data) {
-  static_cast<Follower *>(data)->come_up();
+  static_cast<Follower *>(data)->connect_daemon();
 }
 
 void Follower::vanished(GDBusConnection * /*connection*/, const char * /*name*/, gpointer data) {
@@ -101,11 +101,11 @@ void Follower::fetch_declarations() {
     guint32 id = 0;
     GVariant *entry = nullptr;
     g_variant_get_child(list.get(), i, "(u@a{sv})", &id, &entry);
-    take_declared(id, GVariantPtr(entry).get());
+    handle_declared(id, GVariantPtr(entry).get());
   }
 }
 
-void Follower::take_declared(std::uint32_t id, GVariant *entry) {
+void Follower::handle_declared(std::uint32_t id, GVariant *entry) {
   const char *type = "";
   g_variant_lookup(entry, "type", "&s", &type);
   event_types_[id] = type;
@@ -117,14 +117,14 @@ void Follower::on_control_signal(GDBusConnection * /*connection*/, const char * 
   auto &self = *static_cast<Follower *>(data);
   const std::string_view name = member;
   if (name == "PortChanged" && g_variant_is_of_type(arguments, G_VARIANT_TYPE("(ibbbbbb)"))) {
-    self.take_change(arguments);
+    self.handle_change(arguments);
   } else if (name == "ActionSequenceDone" &&
              g_variant_is_of_type(arguments, G_VARIANT_TYPE("(i)"))) {
-    self.take_sequence(arguments);
+    self.handle_sequence(arguments);
   }
 }
 
-void Follower::take_change(GVariant *arguments) {
+void Follower::handle_change(GVariant *arguments) {
   Change change;
   gboolean is_virtual = FALSE;
   gboolean hidden = FALSE;
@@ -157,7 +157,7 @@ void Follower::take_change(GVariant *arguments) {
   on_change(change, *port);
 }
 
-void Follower::take_sequence(GVariant *arguments) {
+void Follower::handle_sequence(GVariant *arguments) {
   gint32 number = -1;
   g_variant_get(arguments, "(i)", &number);
   on_sequence_done(number, find(number));
@@ -169,16 +169,16 @@ void Follower::on_producer_signal(GDBusConnection * /*connection*/, const char *
   auto &self = *static_cast<Follower *>(data);
   const std::string_view name = member;
   if (name == "Sent" && g_variant_is_of_type(arguments, G_VARIANT_TYPE("(ua{sv})"))) {
-    self.take_sent(arguments);
+    self.handle_sent(arguments);
   } else if (name == "Declared" && g_variant_is_of_type(arguments, G_VARIANT_TYPE("(ua{sv})"))) {
     guint32 id = 0;
     GVariant *entry = nullptr;
     g_variant_get(arguments, "(u@a{sv})", &id, &entry);
-    self.take_declared(id, GVariantPtr(entry).get());
+    self.handle_declared(id, GVariantPtr(entry).get());
   }
 }
 
-void Follower::take_sent(GVariant *arguments) {
+void Follower::handle_sent(GVariant *arguments) {
   SentEvent event;
   GVariant *keys = nullptr;
   g_variant_get(arguments, "(u@a{sv})", &event.id, &keys);

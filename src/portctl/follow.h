@@ -60,13 +60,13 @@ class Follower {
   static void on_producer_signal(GDBusConnection *connection, const char *sender, const char *path,
                                  const char *interface, const char *member, GVariant *arguments,
                                  gpointer data);
-  static gboolean try_again(gpointer data);
+  static gboolean on_retry(gpointer data);
   void subscribe();
-  void come_up();
-  void take_change(GVariant *arguments);
-  void take_sequence(GVariant *arguments);
-  void take_sent(GVariant *arguments);
-  void take_declared(std::uint32_t id, GVariant *entry);
+  void connect_daemon();
+  void handle_change(GVariant *arguments);
+  void handle_sequence(GVariant *arguments);
+  void handle_sent(GVariant *arguments);
+  void handle_declared(std::uint32_t id, GVariant *entry);
   void fetch_declarations();
 
   Bus &bus_;

@@ -90,6 +90,22 @@ std::string json_variant(GVariant *value) {
   return array.text();
 }
 
+std::string event_keys_text(GVariant *keys, std::string_view assign, std::string_view separator) {
+  std::string text;
+  GVariantIter iter;
+  const char *key = nullptr;
+  GVariant *value = nullptr;
+  g_variant_iter_init(&iter, keys);
+  while (g_variant_iter_next(&iter, "{&sv}", &key, &value)) {
+    const GVariantPtr owned(value);
+    if (!std::string_view(key).starts_with("topic")) {
+      text.append(text.empty() ? "" : separator).append(key).append(assign);
+      text += json_variant(value);
+    }
+  }
+  return text;
+}
+
 JsonObject &JsonObject::add_raw(std::string_view key, std::string_view json) {
   members_ += (members_.empty() ? "" : ", ") + json_string(key) + ": " + std::string(json);
   return *this;

@@ -14,6 +14,10 @@ std::string json_string(std::string_view text);
 // and dictionaries (as objects, with keys turned to text).
 std::string json_variant(GVariant *value);
 
+// The keys of an event but for its topic, with their values as JSON: "port=3 state=true".
+std::string event_keys_text(GVariant *keys, std::string_view assign = "=",
+                            std::string_view separator = " ");
+
 class JsonObject {
  public:
   JsonObject &add(std::string_view key, std::string_view text) {

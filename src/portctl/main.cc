@@ -61,7 +61,7 @@ void print_help(const Command &command) {
 }
 
 [[noreturn]] void fail_usage(const std::string &message) {
-  fail(kUsage, message + ": see \"portctl --help\"");
+  fail(STATUS_USAGE, message + ": see \"portctl --help\"");
 }
 
 double parse_seconds(const char *text) {
@@ -89,7 +89,7 @@ void apply_option(Options &options, int letter) {
       break;
     case 'V':
       std::puts("portctl " PORTCTL_VERSION);
-      std::exit(kOk);
+      std::exit(STATUS_OK);
     case 'a':
       options.address = optarg;
       break;
@@ -150,12 +150,12 @@ const char *long_name(int letter) {
 void check_fits(const Command &command, const std::string &letters, std::size_t words) {
   for (const char letter : letters) {
     if (!std::strchr(kEverywhere, letter) && !std::strchr(command.options, letter)) {
-      fail(kUsage, std::string("\"") + command.name + "\" takes no option --" + long_name(letter) +
-                       ": see \"portctl " + command.name + " --help\"");
+      fail(STATUS_USAGE, std::string("\"") + command.name + "\" takes no option --" +
+                             long_name(letter) + ": see \"portctl " + command.name + " --help\"");
     }
   }
   if (words < command.least || words > command.most) {
-    fail(kUsage, std::string("usage: portctl ") + command.name + " " + command.usage);
+    fail(STATUS_USAGE, std::string("usage: portctl ") + command.name + " " + command.usage);
   }
 }
 
@@ -173,7 +173,7 @@ int main(int argc, char **argv) {
   std::vector<std::string> words(argv + optind, argv + argc);
   if (words.empty()) {
     print_overview();
-    return options.help ? kOk : kUsage;
+    return options.help ? STATUS_OK : STATUS_USAGE;
   }
   const Command *command = find_command(words.front());
   if (!command) {
@@ -181,7 +181,7 @@ int main(int argc, char **argv) {
   }
   if (options.help) {
     print_help(*command);
-    return kOk;
+    return STATUS_OK;
   }
   words.erase(words.begin());
   check_fits(*command, letters, words.size());

@@ -24,15 +24,15 @@ class Monitor : public Follower {
 
  private:
   void on_up() override {
-    say("up", "the daemon serves " + std::to_string(ports().size()) + " ports",
-        JsonObject().add("ports", static_cast<std::int64_t>(ports().size())));
+    print("up", "the daemon serves " + std::to_string(ports().size()) + " ports",
+          JsonObject().add("ports", static_cast<std::int64_t>(ports().size())));
   }
-  void on_down() override { say("down", "the daemon is not running", JsonObject()); }
+  void on_down() override { print("down", "the daemon is not running", JsonObject()); }
   void on_change(const Change &change, Port &port) override;
   void on_sequence_done(int number, const Port *port) override;
   void on_event(const SentEvent &event) override;
 
-  void say(const char *kind, const std::string &text, const JsonObject &details) const;
+  void print(const char *kind, const std::string &text, const JsonObject &details) const;
 
   Session &session_;
 };
@@ -41,7 +41,7 @@ std::string label(int number, const Port *port) {
   return "port " + std::to_string(number) + (port ? " " + visible(port->name()) : "");
 }
 
-void Monitor::say(const char *kind, const std::string &text, const JsonObject &details) const {
+void Monitor::print(const char *kind, const std::string &text, const JsonObject &details) const {
   const std::string time = time_stamp();
   if (session_.options.json) {
     std::string members = details.text();
@@ -54,7 +54,7 @@ void Monitor::say(const char *kind, const std::string &text, const JsonObject &d
   }
   // The reader may be gone, or read line by line.
   if (std::fflush(stdout) != 0) {
-    std::exit(kOk);
+    std::exit(STATUS_OK);
   }
 }
 
@@ -77,7 +77,7 @@ void Monitor::on_change(const Change &change, Port &port) {
     text += ", line " + styled(visible(cell.text), cell.style, session_.colours);
     details.add("line", port.supervision->line).add("level", port.supervision->level);
   }
-  say("changed", text + (change.reported ? ", reported by a client" : ""), details);
+  print("changed", text + (change.reported ? ", reported by a client" : ""), details);
 }
 
 void Monitor::on_sequence_done(int number, const Port *port) {
@@ -86,27 +86,17 @@ void Monitor::on_sequence_done(int number, const Port *port) {
   if (port) {
     details.add("identifier", port->id).add("name", port->name());
   }
-  say("sequence-done", label(number, port) + ": the sequence has ended", details);
+  print("sequence-done", label(number, port) + ": the sequence has ended", details);
 }
 
 void Monitor::on_event(const SentEvent &event) {
-  std::string words;
-  GVariantIter iter;
-  const char *key = nullptr;
-  GVariant *value = nullptr;
-  g_variant_iter_init(&iter, event.keys);
-  while (g_variant_iter_next(&iter, "{&sv}", &key, &value)) {
-    const GVariantPtr owned(value);
-    if (!std::string_view(key).starts_with("topic")) {
-      words += " " + visible(key) + "=" + visible(json_variant(value));
-    }
-  }
   const std::string type = event.type.empty() ? "" : " " + visible(event.type);
-  say("event", "event " + std::to_string(event.id) + type + ":" + words,
-      JsonObject()
-          .add("event", event.id)
-          .add("type", event.type)
-          .add_raw("keys", json_variant(event.keys)));
+  print("event",
+        "event " + std::to_string(event.id) + type + ": " + visible(event_keys_text(event.keys)),
+        JsonObject()
+            .add("event", event.id)
+            .add("type", event.type)
+            .add_raw("keys", json_variant(event.keys)));
 }
 
 // --- wait ---
@@ -133,20 +123,20 @@ class Waiter : public Follower {
   bool reached() const { return reached_; }
 
  private:
-  void on_up() override { look(find_port(ports(), word_)); }
+  void on_up() override { check(find_port(ports(), word_)); }
   void on_down() override {}  // it may come (back) in time
   void on_change(const Change & /*change*/, Port &port) override {
     if (&port == &find_port(ports(), word_)) {
-      look(port);
+      check(port);
     }
   }
   void on_sequence_done(int /*number*/, const Port * /*port*/) override {}
 
-  void look(const Port &port) {
+  void check(const Port &port) {
     if (line_ && !port.supervision) {
-      fail(kRefused, "port " + visible(word_) +
-                         ": it has no line state to wait for: give active "
-                         "or inactive");
+      fail(STATUS_REFUSED, "port " + visible(word_) +
+                               ": it has no line state to wait for: give active "
+                               "or inactive");
     }
     if (line_ ? port.supervision->line == state_ : port.active == active_) {
       reached_ = true;
@@ -171,7 +161,7 @@ int monitor_command(Session &session) {
   Monitor monitor(session);
   monitor.start();
   g_main_loop_run(loop.get());
-  return kOk;
+  return STATUS_OK;
 }
 
 int wait_command(Session &session) {
@@ -183,8 +173,8 @@ int wait_command(Session &session) {
   waiter.start();
   g_main_loop_run(loop.get());
   if (!waiter.reached()) {
-    fail(kTimeout, "port " + visible(session.words[0]) + " did not become " +
-                       visible(session.words[1]) + " in time");
+    fail(STATUS_TIMEOUT, "port " + visible(session.words[0]) + " did not become " +
+                             visible(session.words[1]) + " in time");
   }
-  return kOk;
+  return STATUS_OK;
 }

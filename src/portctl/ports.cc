@@ -8,7 +8,7 @@
 namespace {
 
 // Calls that are under way together. Their replies come on a main context of their own: signals
-// that arrive meanwhile wait, so that nobody changes the ports under the hands of who waits here.
+// that arrive meanwhile wait, so that the ports do not change during the wait.
 class Batch {
  public:
   explicit Batch(Ports &of_ports) : ports(of_ports), context_(g_main_context_new()) {
@@ -296,13 +296,13 @@ Port &find_port(Ports &ports, const std::string &word) {
     for (const Port *port : found) {
       candidates += "\n  " + described(*port);
     }
-    fail(kNoPort, "\"" + visible(word) + "\" fits several ports; give the number or the " +
-                      "identifier of one of them:" + candidates);
+    fail(STATUS_NO_PORT, "\"" + visible(word) + "\" fits several ports; give the number or the " +
+                             "identifier of one of them:" + candidates);
   }
   const std::string near = similar(ports, word);
-  fail(kNoPort, "no port has the number, identifier or name \"" + visible(word) + "\"" +
-                    (near.empty() ? ": \"portctl list\" shows those in service"
-                                  : "; similar ones are:" + near));
+  fail(STATUS_NO_PORT, "no port has the number, identifier or name \"" + visible(word) + "\"" +
+                           (near.empty() ? ": \"portctl list\" shows those in service"
+                                         : "; similar ones are:" + near));
 }
 
 std::uint32_t port_number(Bus &bus, const std::string &word) {

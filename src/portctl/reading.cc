@@ -87,21 +87,10 @@ std::string text_of(GVariant *entry, const char *key) {
   return text;
 }
 
-// "port 3, state false", the topic left out.
+// "port 3, state false"
 std::string keys_in_words(GVariant *entry) {
   const GVariantPtr keys(g_variant_lookup_value(entry, "keys", G_VARIANT_TYPE_VARDICT));
-  std::string words;
-  GVariantIter iter;
-  const char *key = nullptr;
-  GVariant *value = nullptr;
-  g_variant_iter_init(&iter, keys.get());
-  while (keys && g_variant_iter_next(&iter, "{&sv}", &key, &value)) {
-    const GVariantPtr owned(value);
-    if (!std::string_view(key).starts_with("topic")) {
-      words += (words.empty() ? "" : ", ") + std::string(key) + " " + json_variant(value);
-    }
-  }
-  return words;
+  return keys ? event_keys_text(keys.get(), " ", ", ") : "";
 }
 
 std::string topic_of(GVariant *entry) {
@@ -135,7 +124,7 @@ int list_command(Session &session) {
   const Ports ports = fetch_ports(session.bus);
   if (session.options.json) {
     std::printf("%s\n", ports_json(ports).c_str());
-    return kOk;
+    return STATUS_OK;
   }
   Table table;
   table.add(heading({"No", "Identifier", "Name", "Role", "State", "Active", "Line", "Flags"}));
@@ -150,7 +139,7 @@ int list_command(Session &session) {
                {port.flag_words()}});
   }
   print(session, table);
-  return kOk;
+  return STATUS_OK;
 }
 
 int get_command(Session &session) {
@@ -168,7 +157,7 @@ int get_command(Session &session) {
       std::puts(active ? "active" : "inactive");
     }
   }
-  return kOk;
+  return STATUS_OK;
 }
 
 int connectors_command(Session &session) {
@@ -182,7 +171,7 @@ int connectors_command(Session &session) {
       array.add_raw(connector_json(connector));
     }
     std::printf("%s\n", array.text().c_str());
-    return kOk;
+    return STATUS_OK;
   }
   Table table;
   table.add(heading({"Kind", "No", "Identifier", "State"}));
@@ -193,7 +182,7 @@ int connectors_command(Session &session) {
                {connector.state ? "plugged in" : "not plugged in"}});
   }
   print(session, table);
-  return kOk;
+  return STATUS_OK;
 }
 
 int events_command(Session &session) {
@@ -217,7 +206,7 @@ int events_command(Session &session) {
   } else {
     print(session, table);
   }
-  return kOk;
+  return STATUS_OK;
 }
 
 // What a shell offers: commands, or each port's number and identifier. Never an error: a completion
@@ -229,7 +218,7 @@ int words_command(Session &session) {
         std::printf("%s:%s\n", command.name, command.summary);
       }
     }
-    return kOk;
+    return STATUS_OK;
   }
   Error error;
   const auto ports = try_fetch_ports(session.bus, error);
@@ -237,5 +226,5 @@ int words_command(Session &session) {
     std::printf("%d:%s\n%s:%s\n", port.number, visible(port.name()).c_str(),
                 visible(port.id).c_str(), visible(port.name()).c_str());
   }
-  return kOk;
+  return STATUS_OK;
 }

@@ -12,16 +12,16 @@
 
 namespace {
 
-constexpr const char *kTake = "\033[?1049h\033[?25l\033[2J";
-constexpr const char *kGiveBack = "\033[0m\033[?25h\033[?1049l";
+constexpr const char *kEnterScreen = "\033[?1049h\033[?25l\033[2J";
+constexpr const char *kRestoreTerminal = "\033[0m\033[?25h\033[?1049l";
 constexpr int kLeastColumns = 40;
 constexpr int kLeastRows = 8;
 
 bool taken = false;
 std::optional<termios> settings_before;
 
-// What can't be written to the terminal any more is not worth a word.
-void put(const std::string &text) {
+// A terminal that is gone is no error.
+void write_terminal(const std::string &text) {
   std::size_t done = 0;
   while (done < text.size()) {
     const ssize_t written = write(STDOUT_FILENO, text.data() + done, text.size() - done);
@@ -32,12 +32,12 @@ void put(const std::string &text) {
   }
 }
 
-void give_back() {
+void restore_terminal() {
   if (!taken) {
     return;
   }
   taken = false;
-  put(kGiveBack);
+  write_terminal(kRestoreTerminal);
   if (settings_before) {
     tcsetattr(STDIN_FILENO, TCSAFLUSH, &*settings_before);
   }
@@ -45,7 +45,7 @@ void give_back() {
 
 // Keys come at once and unseen. A stopped program would leave the screen as it is, so there is no
 // ^Z.
-void take_keys() {
+void read_keys_at_once() {
   termios settings = {};
   if (tcgetattr(STDIN_FILENO, &settings) != 0) {
     return;
@@ -62,18 +62,18 @@ void take_keys() {
 
 Screen::Screen() {
   if (!isatty(STDOUT_FILENO)) {
-    fail(kUsage, R"("watch" needs a terminal: "portctl monitor" prints lines)");
+    fail(STATUS_USAGE, R"("watch" needs a terminal: "portctl monitor" prints lines)");
   }
   taken = true;
   // Also when the program ends with an error in the middle.
-  std::atexit(give_back);
-  take_keys();
-  put(kTake);
+  std::atexit(restore_terminal);
+  read_keys_at_once();
+  write_terminal(kEnterScreen);
   resize();
 }
 
 Screen::~Screen() {
-  give_back();
+  restore_terminal();
 }
 
 void Screen::resize() {
@@ -83,7 +83,7 @@ void Screen::resize() {
     rows_ = std::max<int>(size.ws_row, kLeastRows);
   }
   shown_.clear();
-  put("\033[2J");
+  write_terminal("\033[2J");
 }
 
 void Screen::draw(const std::vector<std::string> &lines) {
@@ -97,5 +97,5 @@ void Screen::draw(const std::vector<std::string> &lines) {
       shown_[i] = line;
     }
   }
-  put(text);
+  write_terminal(text);
 }

@@ -19,10 +19,10 @@ using Steps = std::vector<Step>;
 int parse_milliseconds(const std::string &text) {
   const auto number = parse_number(text);
   if (!number) {
-    fail(kUsage, "\"" + visible(text) + "\" is no time: give milliseconds");
+    fail(STATUS_USAGE, "\"" + visible(text) + "\" is no time: give milliseconds");
   }
   if (*number > 2147483U) {
-    fail(kUsage, "the daemon holds a step for 2147483 ms (35 minutes) at most");
+    fail(STATUS_USAGE, "the daemon holds a step for 2147483 ms (35 minutes) at most");
   }
   return static_cast<int>(*number);
 }
@@ -30,7 +30,8 @@ int parse_milliseconds(const std::string &text) {
 Step parse_step(const std::string &text) {
   const auto colon = text.find(':');
   if (colon == std::string::npos) {
-    fail(kUsage, "\"" + visible(text) + "\" is no step: give STATE:MILLISECONDS, such as on:200");
+    fail(STATUS_USAGE,
+         "\"" + visible(text) + "\" is no step: give STATE:MILLISECONDS, such as on:200");
   }
   return {parse_state(text.substr(0, colon)), parse_milliseconds(text.substr(colon + 1))};
 }
@@ -43,7 +44,7 @@ Steps parse_steps(const std::string &text, int repeat) {
     begin = end + 1;
   }
   if (once.size() * static_cast<std::size_t>(repeat) > kMaxSteps) {
-    fail(kUsage, "that is more than 65536 steps, which the daemon does not take in one go");
+    fail(STATUS_USAGE, "that is more than 65536 steps, which the daemon does not take in one go");
   }
   Steps steps;
   for (int i = 0; i < repeat; ++i) {
@@ -98,7 +99,8 @@ class EndOfSequence {
   }
   static void on_vanished(GDBusConnection * /*connection*/, const char * /*name*/,
                           gpointer /*data*/) {
-    fail(kNoDaemon, "the daemon ended before the sequence did: see \"systemctl status portd\"");
+    fail(STATUS_NO_DAEMON,
+         "the daemon ended before the sequence did: see \"systemctl status portd\"");
   }
 
   Bus &bus_;
@@ -124,7 +126,7 @@ int run(Session &session, const Steps &steps) {
   if (end) {
     end->wait();
   }
-  return kOk;
+  return STATUS_OK;
 }
 
 }  // namespace

@@ -10,8 +10,9 @@ namespace {
 
 const Supervision &supervision_of(const Port &port, const std::string &word) {
   if (!port.supervision) {
-    fail(kRefused, "port " + visible(word) +
-                       ": it can't be supervised: \"portctl supervised\" lists those that can");
+    fail(STATUS_REFUSED,
+         "port " + visible(word) +
+             ": it can't be supervised: \"portctl supervised\" lists those that can");
   }
   return *port.supervision;
 }
@@ -52,7 +53,7 @@ int list(Session &session, const Ports &ports) {
   std::fputs(
       session.options.json ? (array.text() + "\n").c_str() : table.text(session.colours).c_str(),
       stdout);
-  return kOk;
+  return STATUS_OK;
 }
 
 int print_readout(Session &session, const Port &port) {
@@ -75,7 +76,7 @@ int print_readout(Session &session, const Port &port) {
   } else {
     std::printf("%s %u\n", visible(state).c_str(), level);
   }
-  return kOk;
+  return STATUS_OK;
 }
 
 int print_ranges(const Session &session, const Supervision &supervision) {
@@ -94,7 +95,7 @@ int print_ranges(const Session &session, const Supervision &supervision) {
   std::fputs(
       session.options.json ? (array.text() + "\n").c_str() : table.text(session.colours).c_str(),
       stdout);
-  return kOk;
+  return STATUS_OK;
 }
 
 int switch_supervision(Session &session, bool on) {
@@ -104,13 +105,13 @@ int switch_supervision(Session &session, bool on) {
                                                         nullptr, error.out())) {
     fail_call(error, "port " + session.words[0]);
   }
-  return kOk;
+  return STATUS_OK;
 }
 
 std::uint32_t parse_limit(const std::string &text) {
   const auto limit = parse_number(text);
   if (!limit) {
-    fail(kUsage, "\"" + visible(text) + "\" is no limit: give a number from 0 to 65535");
+    fail(STATUS_USAGE, "\"" + visible(text) + "\" is no limit: give a number from 0 to 65535");
   }
   return *limit;
 }
@@ -119,7 +120,7 @@ std::uint32_t parse_limit(const std::string &text) {
 int set_range(Session &session) {
   const auto &words = session.words;
   if (words.size() != 5) {
-    fail(kUsage, "usage: portctl supervised PORT range STATE LOWER UPPER");
+    fail(STATUS_USAGE, "usage: portctl supervised PORT range STATE LOWER UPPER");
   }
   const std::uint32_t lower = parse_limit(words[3]);
   const std::uint32_t upper = parse_limit(words[4]);
@@ -129,7 +130,7 @@ int set_range(Session &session) {
           session.bus.supervised(), number, words[2].c_str(), lower, upper, nullptr, error.out())) {
     fail_call(error, "port " + words[0]);
   }
-  return kOk;
+  return STATUS_OK;
 }
 
 }  // namespace
@@ -140,7 +141,7 @@ int supervised_command(Session &session) {
     return set_range(session);
   }
   if (session.words.size() > 2) {
-    fail(kUsage, "too many words: see \"portctl supervised --help\"");
+    fail(STATUS_USAGE, "too many words: see \"portctl supervised --help\"");
   }
   if (action == "on" || action == "off") {
     return switch_supervision(session, action == "on");
@@ -160,6 +161,7 @@ int supervised_command(Session &session) {
   if (action == "ranges") {
     return print_ranges(session, supervision);
   }
-  fail(kUsage, "\"" + visible(action) +
-                   "\" is nothing to do with supervision: give on, off, readout, ranges or range");
+  fail(STATUS_USAGE,
+       "\"" + visible(action) +
+           "\" is nothing to do with supervision: give on, off, readout, ranges or range");
 }

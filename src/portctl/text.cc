@@ -11,7 +11,7 @@ namespace {
 constexpr const char *kReset = "\033[0m";
 
 // Marks that turn the writing direction can make a line read as another one.
-bool turns_direction(gunichar character) {
+bool changes_direction(gunichar character) {
   return character == 0x061C || (character >= 0x200E && character <= 0x200F) ||
          (character >= 0x2028 && character <= 0x202E) ||
          (character >= 0x2066 && character <= 0x2069) || character == 0xFEFF;
@@ -51,7 +51,7 @@ int cell_width(gunichar character) {
 }  // namespace
 
 bool is_unsafe(gunichar character) {
-  return g_unichar_iscntrl(character) || turns_direction(character);
+  return g_unichar_iscntrl(character) || changes_direction(character);
 }
 
 std::string visible(std::string_view text) {
@@ -66,7 +66,7 @@ std::string visible(std::string_view text) {
     const char *const next = g_utf8_next_char(at);
     if (g_unichar_iscntrl(character)) {
       shown += escaped("\\x%02x", character);
-    } else if (turns_direction(character)) {
+    } else if (changes_direction(character)) {
       shown += escaped("\\u{%04x}", character);
     } else {
       shown.append(at, next);

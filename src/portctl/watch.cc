@@ -19,7 +19,7 @@
 namespace {
 
 constexpr guint kTickMs = 250;
-constexpr int kTicksBetweenLooks = 8;
+constexpr int kTicksPerFetch = 8;
 constexpr gint64 kHighlightUs = gint64{2} * G_USEC_PER_SEC;
 constexpr std::size_t kNewsKept = 200;
 constexpr std::size_t kLongestNote = 4096;
@@ -49,12 +49,12 @@ class Watch : public Follower {
   static gboolean on_key(gint fd, GIOCondition condition, gpointer data);
   static gboolean on_notes(gint fd, GIOCondition condition, gpointer data);
 
-  void take_key(char key);
-  void take_notes(const char *text, std::size_t size);
+  void handle_key(char key);
+  void handle_notes(const char *text, std::size_t size);
   void watch_notes();
-  void tell(const std::string &text);
+  void add_news(const std::string &text);
   void draw();
-  void look_around();
+  void refresh();
 
   Session &session_;
   Screen &screen_;
@@ -89,7 +89,7 @@ void Watch::begin() {
 void Watch::watch_notes() {
   notes_.reset(open(session_.options.notes.c_str(), O_RDWR | O_NONBLOCK | O_CLOEXEC));
   if (!notes_) {
-    fail(kUsage,
+    fail(STATUS_USAGE,
          "--notes: " + visible(session_.options.notes) + " can't be opened: " + g_strerror(errno));
   }
   g_unix_fd_add(notes_.get(), G_IO_IN, on_notes, this);
@@ -101,23 +101,23 @@ gboolean Watch::on_notes(gint fd, GIOCondition /*condition*/, gpointer data) {
   if (size <= 0) {
     return size < 0 && errno == EAGAIN ? G_SOURCE_CONTINUE : G_SOURCE_REMOVE;
   }
-  static_cast<Watch *>(data)->take_notes(text, static_cast<std::size_t>(size));
+  static_cast<Watch *>(data)->handle_notes(text, static_cast<std::size_t>(size));
   return G_SOURCE_CONTINUE;
 }
 
-void Watch::take_notes(const char *text, std::size_t size) {
+void Watch::handle_notes(const char *text, std::size_t size) {
   for (std::size_t i = 0; i < size; ++i) {
     if (text[i] != '\n') {
       note_ += text[i];
     }
     if (text[i] == '\n' || note_.size() >= kLongestNote) {
-      tell(note_);
+      add_news(note_);
       note_.clear();
     }
   }
 }
 
-void Watch::tell(const std::string &text) {
+void Watch::add_news(const std::string &text) {
   news_.push_back(clock_time() + "  " + visible(text));
   if (news_.size() > kNewsKept) {
     news_.pop_front();
@@ -127,12 +127,12 @@ void Watch::tell(const std::string &text) {
 
 void Watch::on_up() {
   up_ = true;
-  tell("the daemon serves " + std::to_string(ports().size()) + " ports");
+  add_news("the daemon serves " + std::to_string(ports().size()) + " ports");
 }
 
 void Watch::on_down() {
   up_ = false;
-  tell("the daemon is not running");
+  add_news("the daemon is not running");
 }
 
 void Watch::on_change(const Change &change, Port &port) {
@@ -142,36 +142,25 @@ void Watch::on_change(const Change &change, Port &port) {
   if (port.supervision && port.supervision->on) {
     text += ", the line " + line_cell(port).text;
   }
-  tell(text + (change.reported ? ", reported by a client" : ""));
+  add_news(text + (change.reported ? ", reported by a client" : ""));
 }
 
 void Watch::on_sequence_done(int number, const Port *port) {
-  tell("port " + std::to_string(number) + (port ? " " + port->name() : "") +
-       ": the sequence has ended");
+  add_news("port " + std::to_string(number) + (port ? " " + port->name() : "") +
+           ": the sequence has ended");
 }
 
 void Watch::on_event(const SentEvent &event) {
-  std::string words;
-  GVariantIter iter;
-  const char *key = nullptr;
-  GVariant *value = nullptr;
-  g_variant_iter_init(&iter, event.keys);
-  while (g_variant_iter_next(&iter, "{&sv}", &key, &value)) {
-    const GVariantPtr owned(value);
-    if (!std::string_view(key).starts_with("topic")) {
-      words += " " + std::string(key) + "=" + json_variant(value);
-    }
-  }
-  tell("event " + std::to_string(event.id) + (event.type.empty() ? "" : " " + event.type) + ":" +
-       words);
+  add_news("event " + std::to_string(event.id) + (event.type.empty() ? "" : " " + event.type) +
+           ": " + event_keys_text(event.keys));
 }
 
 // Levels move without a signal, and so do names, ranges and supervision when others set them.
-void Watch::look_around() {
+void Watch::refresh() {
   if (!up_) {
     return;
   }
-  if (++ticks_ % kTicksBetweenLooks == 0) {
+  if (++ticks_ % kTicksPerFetch == 0) {
     fetch();
     return;
   }
@@ -184,7 +173,7 @@ void Watch::look_around() {
 
 gboolean Watch::tick(gpointer data) {
   auto &self = *static_cast<Watch *>(data);
-  self.look_around();
+  self.refresh();
   self.draw();
   return G_SOURCE_CONTINUE;
 }
@@ -210,13 +199,13 @@ gboolean Watch::on_key(gint fd, GIOCondition /*condition*/, gpointer data) {
     return G_SOURCE_REMOVE;
   }
   for (ssize_t i = 0; i < count; ++i) {
-    self.take_key(keys[i]);
+    self.handle_key(keys[i]);
   }
   self.draw();
   return G_SOURCE_CONTINUE;
 }
 
-void Watch::take_key(char key) {
+void Watch::handle_key(char key) {
   escape_ += key;
   if (escape_ == "\033" || escape_ == "\033[" || escape_ == "\033O") {
     return;
@@ -261,5 +250,5 @@ int watch_command(Session &session) {
   Watch watch(session, screen, loop.get());
   watch.begin();
   g_main_loop_run(loop.get());
-  return kOk;
+  return STATUS_OK;
 }

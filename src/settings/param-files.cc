@@ -22,7 +22,7 @@ namespace {
 constexpr std::size_t kRandomLetters = 6;
 
 // False with errno.
-bool give(std::string path, uid_t uid, gid_t gid) {
+bool change_owner(std::string path, uid_t uid, gid_t gid) {
   const RegularFile file = open_trusted_file(path, nullptr);
   if (!file.fd) {
     return false;
@@ -49,7 +49,7 @@ void remove_if_own(const std::string &path) {
   struct stat status {};
   if (lstat(path.c_str(), &status) == 0 && S_ISREG(status.st_mode) && status.st_nlink == 1 &&
       is_own_account(status.st_uid)) {
-    log_info("Removing %s, which a save that was cut off has left", path.c_str());
+    log_info("Removing %s, left by an interrupted save", path.c_str());
     unlink(path.c_str());
   }
 }
@@ -68,7 +68,7 @@ void param_chown_to_service_user(const std::string &file) {
     log_warning("Failed to get gid");
     return;
   }
-  if (!give(file, uid, service_group->gr_gid)) {
+  if (!change_owner(file, uid, service_group->gr_gid)) {
     log_warning("chown failed on file '%s': (%d) %s", file.c_str(), errno, g_strerror(errno));
   }
 }

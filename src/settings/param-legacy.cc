@@ -91,7 +91,7 @@ std::string readable_name(std::string_view raw) {
 void import_name(const Group &group, const Entry &entry, IOPort *port, bool input) {
   const std::string name = readable_name(entry.value);
   if (!port_name_valid(name)) {
-    log_warning("%s in group %s is too long for a name of port %s and is left out", entry.key,
+    log_warning("%s in group %s is too long for a name of port %s and is ignored", entry.key,
                 group.name, io_port_describe(port));
   } else if (input) {
     io_port_set_input_name(port, name);
@@ -168,7 +168,7 @@ Next import_output(const Group &group, const Entry &entry, std::uint64_t number)
                                                  : report_unreadable(group, "Output");
 }
 
-// The port is told its direction when it is set up.
+// The backend gets the direction when the port is set up.
 Next import_port(const Group &group, const Entry &entry, std::uint64_t number) {
   const IOPortRef port = find_port(number);
   if (!port || io_port_get_type(port.get()) != PORT_CONFIGURABLE ||
@@ -238,7 +238,7 @@ void copy_group(GKeyFile *from, GKeyFile *into, const char *group) {
   }
 }
 
-// Those who collect these messages know them by the operation and these numbers.
+// Fixed: the operation and the numbers in the messages.
 bool store(GKeyFile *file, const char *path) {
   gsize length = 0;
   const GCharPtr text(g_key_file_to_data(file, &length, nullptr));
@@ -264,13 +264,13 @@ std::optional<std::string> param_read_parhand(const char *path) {
     return std::nullopt;
   }
   if (file.fd && !is_own_account(file.status.st_uid)) {
-    log_warning("Left %s alone: it belongs to uid %u", path,
+    log_warning("Ignored %s: it belongs to uid %u", path,
                 static_cast<unsigned>(file.status.st_uid));
     return std::nullopt;
   }
   auto text = file.fd ? read_file(file, kMostBytes, error.out()) : std::nullopt;
   if (!text) {
-    log_warning("Left %s alone: %s", path, error.message());
+    log_warning("Ignored %s: %s", path, error.message());
   }
   return text;
 }
@@ -308,7 +308,7 @@ bool param_upgrade(const char *input, const char *output, GError **error) {
   }
   const GKeyFilePtr into = load(output, keep_all);
   if (!into) {
-    // Names the input file too: what reads these messages looks for that.
+    // Fixed: the message names the input file here too.
     g_set_error(error, io_control_error_quark(), IO_CONTROL_ERROR_GENERIC,
                 "Unable to open output file: %s", input);
     return false;

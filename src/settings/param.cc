@@ -27,17 +27,17 @@ GKeyFilePtr key_file;  // guarded by settings_lock; none between two operations 
 std::string key_file_path;  // guarded by settings_lock; where it was read from
 
 // What was asked for and is not being stored yet, by file. The lock is taken last.
-struct Waiting {
+struct Pending {
   std::vector<PortSettings> settings;
   std::vector<std::function<void()>> ended;  // whom to tell
 };
-std::mutex waiting_lock;
-std::map<std::string, Waiting> waiting;  // guarded by waiting_lock
+std::mutex pending_lock;
+std::map<std::string, Pending> pending;  // guarded by pending_lock
 
 // --- Requests ---
 
 // A later request of the same port takes the place of the earlier one.
-void put(std::vector<PortSettings> &all, PortSettings settings) {
+void insert_or_replace(std::vector<PortSettings> &all, PortSettings settings) {
   const auto same = std::find_if(all.begin(), all.end(), [&](const PortSettings &earlier) {
     return earlier.group == settings.group;
   });
@@ -48,34 +48,34 @@ void put(std::vector<PortSettings> &all, PortSettings settings) {
   }
 }
 
-void add_waiting(const std::string &file, PortSettings settings, std::function<void()> ended) {
-  const std::lock_guard lock(waiting_lock);
-  Waiting &all = waiting[file];
-  put(all.settings, std::move(settings));
+void add_pending(const std::string &file, PortSettings settings, std::function<void()> ended) {
+  const std::lock_guard lock(pending_lock);
+  Pending &all = pending[file];
+  insert_or_replace(all.settings, std::move(settings));
   if (ended) {
     all.ended.push_back(std::move(ended));
   }
 }
 
-Waiting take_waiting(const std::string &file) {
-  const std::lock_guard lock(waiting_lock);
-  auto taken = waiting.extract(file);
-  return taken ? std::move(taken.mapped()) : Waiting();
+Pending take_pending(const std::string &file) {
+  const std::lock_guard lock(pending_lock);
+  auto taken = pending.extract(file);
+  return taken ? std::move(taken.mapped()) : Pending();
 }
 
-std::vector<std::string> files_waited_for() {
-  const std::lock_guard lock(waiting_lock);
+std::vector<std::string> pending_files() {
+  const std::lock_guard lock(pending_lock);
   std::vector<std::string> files;
-  files.reserve(waiting.size());
-  for (const auto &[file, settings] : waiting) {
+  files.reserve(pending.size());
+  for (const auto &[file, settings] : pending) {
     files.push_back(file);
   }
   return files;
 }
 
-bool is_waited_for(const std::string &file) {
-  const std::lock_guard lock(waiting_lock);
-  return waiting.contains(file);
+bool is_pending(const std::string &file) {
+  const std::lock_guard lock(pending_lock);
+  return pending.contains(file);
 }
 
 // --- The operations, with the lock held ---
@@ -150,7 +150,7 @@ void change_and_write(const std::string &file, Change change) {
 // The same with what waits to be stored in the file, which is older than what `change` brings.
 template <typename Change>
 void store(const std::string &file, Change change) {
-  Waiting earlier = take_waiting(file);
+  Pending earlier = take_pending(file);
   change_and_write(file, [&] {
     for (const PortSettings &settings : earlier.settings) {
       port_settings_store(settings, key_file.get());
@@ -163,9 +163,9 @@ void store(const std::string &file, Change change) {
 }
 
 // On the thread of the storage writer.
-void store_waiting() {
+void store_pending() {
   const std::lock_guard lock(settings_lock);
-  for (const std::string &file : files_waited_for()) {
+  for (const std::string &file : pending_files()) {
     store(file, [] {});
   }
 }
@@ -175,7 +175,7 @@ void store_waiting() {
 bool param_read_configuration(const std::string &file) {
   const std::lock_guard lock(settings_lock);
   key_file.reset();
-  if (is_waited_for(file)) {
+  if (is_pending(file)) {
     store(file, [] {});
   }
   return read_configuration(file);
@@ -217,8 +217,8 @@ void param_request_save(IOPort *port, const std::string &file, std::function<voi
     }
     return;
   }
-  add_waiting(file, std::move(*settings), std::move(ended));
-  storage_writer_ask(store_waiting);
+  add_pending(file, std::move(*settings), std::move(ended));
+  storage_writer_request(store_pending);
 }
 
 void param_save_all(const std::string &file) {

@@ -1,8 +1,8 @@
 // The port settings file: a key file with one group a port, which outlives restarts. Groups, keys
 // and comments of others in it are kept as they are.
 //
-// Operations lock the file in memory by themselves; the registry lock, where both are needed, is
-// taken first. Main thread.
+// Operations take the settings lock by themselves, since the storage writer stores on a thread of
+// its own; the registry lock, where both are needed, is taken first. Main thread.
 #pragma once
 
 #include <functional>
@@ -14,7 +14,7 @@ inline constexpr const char *kSettingsFile = "/etc/portd/portd.conf";
 
 // Replaces the key file in memory by the contents of `file`, with every save that was asked for; a
 // missing file reads as empty. False, with a message on standard error and no key file held, when
-// the file can't be read, or when nobody can tell whether it exists. Only a regular file is read,
+// the file can't be read, or when its existence is not known. Only a regular file is read,
 // and a link to one only where root or the daemon's own account owns the link.
 bool param_read_configuration(const std::string &file);
 // Writes the key file in memory. False, with a message on standard error, when it can't be stored;
@@ -37,7 +37,7 @@ void param_save_for_port(IOPort *port, const std::string &file);
 // `ended`, if any, is called from the main loop when the save has ended, well or not.
 void param_request_save(IOPort *port, const std::string &file,
                         std::function<void()> ended = nullptr);
-// The same for every port in service whose number is below their count, in one go. Waits for
+// The same for every port in service whose number is below their count, at once. Waits for
 // storage.
 void param_save_all(const std::string &file);
 

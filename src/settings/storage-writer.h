@@ -1,8 +1,8 @@
-// The thread that waits for storage while the daemon serves, so that nobody else has to.
+// The thread that writes to storage while the daemon serves, so that the main loop never waits.
 //
 // It does one piece of work after another. Each piece keeps, under a lock of its own, what is to be
 // stored; what is added before the work begins is stored with it. The thread starts with the first
-// request; where it can't, the work is done at once by whoever asks.
+// request; where it can't, the caller does the work at once.
 #pragma once
 
 #include <cstdint>
@@ -11,8 +11,8 @@ using StorageWork = void (*)();
 
 // Has `work` run after what was asked for earlier. Asked for again before it began, it runs once.
 // The caller holds no lock that `work` takes. Any thread.
-void storage_writer_ask(StorageWork work);
+void storage_writer_request(StorageWork work);
 // Waits until everything that was asked for is done, and ends the thread. False when storage hangs
 // until `deadline_us`, in g_get_monotonic_time(): the thread is still there then. Main thread, when
-// nobody asks any more.
+// no more requests come.
 bool storage_writer_finish(std::int64_t deadline_us);

@@ -91,10 +91,10 @@ std::vector<SharedSetting> shared_settings(const IioChannel &channel, int device
 // False: there is no such file.
 bool write_shared(const SharedSetting &setting) {
   const SysfsWrite result = sysfs_write(setting.path, setting.text);
-  if (result == SysfsWrite::not_closed) {
+  if (result == SysfsWrite::kNotClosed) {
     log_critical("Couldn't close %s", setting.name);
   }
-  return result != SysfsWrite::not_opened;
+  return result != SysfsWrite::kNotOpened;
 }
 
 bool set_text_property(IioChannel *channel, std::string_view key, const char *value) {

@@ -44,7 +44,7 @@ bool is_usable(IOPort *port, IioLine *line, int device) {
   return refused.empty();
 }
 
-bool connect_anew(IOPort *port, IioLine *line) {
+bool reconnect(IOPort *port, IioLine *line) {
   const int device = iio_find_number(line->device_name(), IIO_KIND_DEVICE);
   if (device < 0 || !is_usable(port, line, device) || !line->connect(port)) {
     return false;
@@ -54,10 +54,10 @@ bool connect_anew(IOPort *port, IioLine *line) {
   return true;
 }
 
-bool try_again(gpointer user_data) {
+bool attempt(gpointer user_data) {
   auto *port = static_cast<IOPort *>(user_data);
   IioLine *line = line_of(port);
-  if (line->is_gone() && !connect_anew(port, line)) {
+  if (line->is_gone() && !reconnect(port, line)) {
     return false;
   }
   return line->resume(port);
@@ -65,14 +65,14 @@ bool try_again(gpointer user_data) {
 
 }  // namespace
 
-void iio_try_later(IOPort *port) {
-  line_of(port)->retry.start(try_again, port);
+void iio_retry_later(IOPort *port) {
+  line_of(port)->retry.start(attempt, port);
 }
 
-bool iio_try_now(IOPort *port) {
-  const bool works = try_again(port);
+bool iio_retry_now(IOPort *port) {
+  const bool works = attempt(port);
   if (!works) {
-    iio_try_later(port);
+    iio_retry_later(port);
   }
   return works;
 }

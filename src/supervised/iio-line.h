@@ -29,6 +29,6 @@ struct IioLine : SupervisedLine {
 };
 
 // The line can't be read or watched now: tries again after growing pauses.
-void iio_try_later(IOPort *port);
+void iio_retry_later(IOPort *port);
 // The same, but first at once. False: it does not work yet.
-bool iio_try_now(IOPort *port);
+bool iio_retry_now(IOPort *port);

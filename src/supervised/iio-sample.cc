@@ -19,7 +19,7 @@ std::uint32_t assemble(const IioSampleType &type, const IioSample &sample) {
   return value;
 }
 
-std::uint32_t take_significant(const IioSampleType &type, std::uint32_t value) {
+std::uint32_t extract_significant(const IioSampleType &type, std::uint32_t value) {
   if (type.bits >= kWidth) {
     return value;
   }
@@ -55,5 +55,5 @@ std::uint32_t iio_shift_right(std::uint32_t value, std::int64_t distance) {
 
 std::uint32_t iio_decode_sample(const IioSampleType &type, const IioSample &sample, int shift) {
   const std::uint32_t stored = iio_shift_right(assemble(type, sample), type.shift);
-  return iio_shift_right(take_significant(type, stored), shift);
+  return iio_shift_right(extract_significant(type, stored), shift);
 }

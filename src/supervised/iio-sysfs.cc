@@ -79,7 +79,7 @@ SysfsWrite sysfs_write(const std::string &path, const std::string &text) {
   UniqueFd file(open(path.c_str(), O_WRONLY | O_TRUNC | O_CLOEXEC));
   if (!file) {
     log_critical("Failed to open sysfs path '%s': %s", path.c_str(), g_strerror(errno));
-    return SysfsWrite::not_opened;
+    return SysfsWrite::kNotOpened;
   }
   const bool written = write(file.get(), text.data(), text.size()) >= 0;
   if (!written) {
@@ -87,9 +87,9 @@ SysfsWrite sysfs_write(const std::string &path, const std::string &text) {
   }
   if (close(file.release()) != 0) {
     log_critical("Failed to close sysfs path '%s': %s", path.c_str(), g_strerror(errno));
-    return SysfsWrite::not_closed;
+    return SysfsWrite::kNotClosed;
   }
-  return written ? SysfsWrite::done : SysfsWrite::not_written;
+  return written ? SysfsWrite::kDone : SysfsWrite::kNotWritten;
 }
 
 SysfsWrite sysfs_write_number(const std::string &path, int number) {

@@ -16,7 +16,7 @@ std::string iio_path(const std::string &absolute);
 // `error` in place of the message where one is asked for.
 std::optional<std::string> sysfs_read(const std::string &path);
 std::optional<std::string> sysfs_read(const std::string &path, GError **error);
-enum class SysfsWrite { done, not_opened, not_written, not_closed };
+enum class SysfsWrite { kDone, kNotOpened, kNotWritten, kNotClosed };
 // Writes a text in one piece. A failure is logged; what follows may work all the same.
 SysfsWrite sysfs_write(const std::string &path, const std::string &text);
 // Writes a flag: the first digit of a number.

@@ -32,7 +32,7 @@ UniqueFd open_file(const std::string &path) {
 }
 
 // The kernel takes every write for a whole new value. Cutting the file first makes that so for any
-// file. A threshold beyond what the converter can measure is refused for good, and never crossed.
+// file. A threshold beyond what the converter can measure is refused, and can never be crossed.
 bool write_text(const UniqueFd &file, std::string_view text) {
   if (!file) {
     return false;

@@ -8,7 +8,6 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <mutex>
 #include <utility>
 #include <vector>
 
@@ -24,7 +23,6 @@ struct Watched {
   const IntDevice *device;
 };
 
-std::mutex devices_lock;
 std::vector<std::weak_ptr<IntDevice>> devices;
 std::vector<Watched> watched_ports;
 
@@ -88,20 +86,20 @@ std::vector<IntListener> end_watch(IntDevice *device) {
   return listeners;
 }
 
-enum class Read { event, nothing, failed };
+enum class Read { kEvent, kNothing, kFailed };
 
 Read read_event(const IntDevice *device, iio_event_data *event) {
   const ssize_t length = read(device->events.get(), event, sizeof *event);
   if (length == static_cast<ssize_t>(sizeof *event)) {
-    return Read::event;
+    return Read::kEvent;
   }
   if (length < 0 && (errno == EAGAIN || errno == EINTR)) {
-    return Read::nothing;
+    return Read::kNothing;
   }
   if (length >= 0) {
     errno = length == 0 ? ENODEV : EIO;
   }
-  return Read::failed;
+  return Read::kFailed;
 }
 
 // The ports of that channel, on whatever device, their events disabled.
@@ -120,22 +118,21 @@ std::vector<IntListener> disable_channel(int channel) {
 // would wake the main loop without end.
 using Call = void (*IntListener::*)(IOPort *port);
 
-Call take_event(IntDevice *device, GIOCondition condition, std::vector<IntListener> *listeners) {
-  const std::lock_guard lock(devices_lock);
+Call handle_event(IntDevice *device, GIOCondition condition, std::vector<IntListener> *listeners) {
   iio_event_data event{};
-  Read result = Read::failed;
+  Read result = Read::kFailed;
   if ((condition & G_IO_IN) != 0) {
     result = read_event(device, &event);
   } else {
     errno = ENODEV;
   }
-  if (result == Read::failed) {
+  if (result == Read::kFailed) {
     device->gone = errno == ENODEV;
     log_critical("read Error: %s", g_strerror(errno));
     *listeners = end_watch(device);
     return &IntListener::lost;
   }
-  if (result == Read::event) {
+  if (result == Read::kEvent) {
     *listeners = disable_channel(IIO_EVENT_CODE_EXTRACT_CHAN(event.id));
   }
   return &IntListener::handle;
@@ -143,14 +140,14 @@ Call take_event(IntDevice *device, GIOCondition condition, std::vector<IntListen
 
 gboolean on_event(gint /*fd*/, GIOCondition condition, gpointer user_data) {
   std::vector<IntListener> listeners;
-  const Call call = take_event(static_cast<IntDevice *>(user_data), condition, &listeners);
+  const Call call = handle_event(static_cast<IntDevice *>(user_data), condition, &listeners);
   for (const auto &listener : listeners) {
     (listener.*call)(listener.port);
   }
   return G_SOURCE_CONTINUE;
 }
 
-// The kernel wakes nobody for a device that is gone, and no event would ever come again.
+// The kernel does not wake a poll when the device goes away, so it is checked for.
 gboolean check_device(gpointer user_data) {
   return on_event(-1, G_IO_IN, user_data);
 }
@@ -158,7 +155,6 @@ gboolean check_device(gpointer user_data) {
 }  // namespace
 
 IntDevicePtr int_device_get(const std::string &path) {
-  const std::lock_guard lock(devices_lock);
   IntDevicePtr device = find_device(path);
   if (device) {
     return device;
@@ -175,7 +171,6 @@ IntDevicePtr int_device_get(const std::string &path) {
 }
 
 void int_device_watch(const IntDevicePtr &device, const IntListener &listener) {
-  const std::lock_guard lock(devices_lock);
   if (find_watched(listener.port) == watched_ports.end()) {
     watched_ports.push_back({listener, device.get()});
     ++device->users;
@@ -187,7 +182,6 @@ void int_device_watch(const IntDevicePtr &device, const IntListener &listener) {
 }
 
 void int_device_unwatch(const IntDevicePtr &device, const IOPort *port) {
-  const std::lock_guard lock(devices_lock);
   const auto watched = find_watched(port);
   if (watched == watched_ports.end()) {
     return;

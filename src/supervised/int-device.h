@@ -1,8 +1,5 @@
 // The event descriptors of converters that raise threshold events. The kernel gives out one for
-// each device, so the ports on a device share it.
-//
-// The list of devices and of watched ports has a lock of its own. It is held while ports are told
-// to disable their events, and released before they are told anything else. Main thread.
+// each device, so the ports on a device share it. Main thread.
 #pragma once
 
 #include <cstdint>
@@ -28,11 +25,11 @@ using IntDevicePtr = std::shared_ptr<IntDevice>;
 // opened anew. None, with a message and errno, when it can't be had.
 IntDevicePtr int_device_get(const std::string &path);
 
-// What a port on a device is told.
+// The callbacks of a port on a device.
 struct IntListener {
   IOPort *port;
   std::uint32_t channel;
-  // Its channel has an event: disable further events. Called under the lock.
+  // Its channel has an event: disable further events.
   void (*disable)(IOPort *port);
   // After that, once for each event.
   void (*handle)(IOPort *port);

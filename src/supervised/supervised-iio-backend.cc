@@ -62,7 +62,7 @@ IioSupervisedData *data_of(IOPort *port) {
 }
 
 bool iio_set_control_pins(IOPort *port) {
-  supervised_demand_input(port);
+  supervised_assert_input(port);
   return supervised_drive_control_pins(port, supervised_control_levels(port));
 }
 
@@ -111,9 +111,8 @@ std::string scan_element(const IioSupervisedData *data, int device) {
              : element + std::to_string(data->channel);
 }
 
-// A converter of another kind than the board was designed for. Its readings would be nonsense from
-// the first one on, so the daemon does not run with it.
-void demand_usable_sample_type(const IioSupervisedData *backend) {
+// Fixed: a converter of another kind than the board was designed for ends the daemon.
+void assert_sample_type(const IioSupervisedData *backend) {
   g_assert(backend->iio_type.sign == 'u');
   g_assert(backend->iio_type.bits <= 32);
   g_assert(backend->iio_type.size <= 32);
@@ -129,7 +128,7 @@ bool read_sample_type(IOPort *port, IioSupervisedData *data, const std::string &
     return false;
   }
   data->iio_type = *type;
-  demand_usable_sample_type(data);
+  assert_sample_type(data);
   return true;
 }
 
@@ -183,9 +182,9 @@ bool iio_setup_sysfs(IOPort *port, IioSupervisedData *data) {
 
 // --- Samples ---
 
-enum class Read { sample, nothing, cut_off, failed };
+enum class Read { kSample, kNothing, kTruncated, kFailed };
 
-Read failed_read(IioSupervisedData *data, int code, GError **error, Read result = Read::failed) {
+Read failed_read(IioSupervisedData *data, int code, GError **error, Read result = Read::kFailed) {
   data->lost = true;
   data->gone = data->gone || code == ENODEV;
   const char *reason = g_strerror(code);
@@ -198,17 +197,17 @@ Read read_sample(IioSupervisedData *data, GError **error) {
   IioSample sample{};
   const ssize_t length = read(data->fd.get(), sample.data(), data->iio_type.bytes);
   if (length < 0 && (errno == EAGAIN || errno == EINTR)) {
-    return Read::nothing;
+    return Read::kNothing;
   }
   if (length <= 0) {
     return failed_read(data, length == 0 ? ENODEV : errno, error);
   }
   if (static_cast<std::size_t>(length) != data->iio_type.bytes) {
-    return failed_read(data, EIO, error, Read::cut_off);
+    return failed_read(data, EIO, error, Read::kTruncated);
   }
   data->last_level = iio_decode_sample(data->iio_type, sample, data->shift);
   data->lost = false;
-  return Read::sample;
+  return Read::kSample;
 }
 
 // Answers from the last sample; before the first one the level is 0. Also from action threads.
@@ -230,11 +229,11 @@ void end_watch(IioSupervisedData *data) {
   data->device_check.reset();
 }
 
-// A device that can't be read would wake the main loop without end. It is tried again instead.
-void lose_device(IOPort *port, IioSupervisedData *data) {
+// A device that can't be read would wake the main loop endlessly. It is retried instead.
+void on_device_lost(IOPort *port, IioSupervisedData *data) {
   data->lost = true;
   end_watch(data);
-  iio_try_later(port);
+  iio_retry_later(port);
 }
 
 gboolean on_sample(gint /*fd*/, GIOCondition condition, gpointer user_data) {
@@ -243,30 +242,30 @@ gboolean on_sample(gint /*fd*/, GIOCondition condition, gpointer user_data) {
   Error error;
   const Read result = (condition & G_IO_IN) != 0 ? read_sample(data, error.out())
                                                  : failed_read(data, ENODEV, error.out());
-  if (result == Read::nothing) {
+  if (result == Read::kNothing) {
     return G_SOURCE_CONTINUE;
   }
   SupervisedRangeState state = SUPERVISED_STATE_UNDEFINED;
-  if (result == Read::sample) {
+  if (result == Read::kSample) {
     (void)supervised_classify_for_port(port, data->last_level, &state, error.out());
   }
   if (error) {
     log_critical("Readout failed: %s", error.message());
   }
-  if (result == Read::failed) {
-    lose_device(port, data);
+  if (result == Read::kFailed) {
+    on_device_lost(port, data);
   }
   supervised_report_state(port, state);
   return G_SOURCE_CONTINUE;
 }
 
-// The kernel wakes nobody for a device that is gone, and its last sample would stand for ever.
+// The kernel does not wake a poll when the device goes away, and the last sample would be kept.
 gboolean check_device(gpointer user_data) {
   return on_sample(-1, G_IO_IN, user_data);
 }
 
-// The kernel keeps the oldest samples when its buffer is full: what was queued while nobody watched
-// says nothing of the line as it is now. False: the device can't be read.
+// The kernel keeps the oldest samples when its buffer is full: what was queued before the watch
+// says nothing of the line now. False: the device can't be read.
 bool drop_queued_samples(IioSupervisedData *data) {
   constexpr int most = 64;  // a device that is faster than this is drained enough
   std::array<std::uint8_t, 4096> queued{};
@@ -336,7 +335,7 @@ bool IioSupervisedData::setup_line(IOPort *port) {
   return false;
 }
 
-// Switched on again it begins anew: what could not be had before may be there now.
+// Starts from the beginning: a device that was missing may be there now.
 void IioSupervisedData::set_line_watch(IOPort *port, bool on) {
   if (!on) {
     end_watch(this);
@@ -344,7 +343,7 @@ void IioSupervisedData::set_line_watch(IOPort *port, bool on) {
     lost = false;
   } else if (!device_watch) {
     last_state = SUPERVISED_STATE_UNDEFINED;
-    lost = !iio_try_now(port) || lost;
+    lost = !iio_retry_now(port) || lost;
   }
 }
 
@@ -366,8 +365,8 @@ bool IioSupervisedData::connect(IOPort *port) {
   return iio_setup_sysfs(port, this);
 }
 
-// A device that still can't be read is not worth another message; one that could be read last gets
-// one from its watch.
+// A device that still can't be read is not logged again; one that could be read before is logged by
+// its watch.
 bool IioSupervisedData::resume(IOPort *port) {
   if (!drop_queued_samples(this) && lost) {
     return false;

@@ -55,7 +55,7 @@ IioIntSupervisedData *data_of(IOPort *port) {
 
 // On some boards the plain path's pull-up is what feeds the measured line.
 bool iio_int_set_control_pins(IOPort *port) {
-  supervised_demand_input(port);
+  supervised_assert_input(port);
   ControlLevels levels = supervised_control_levels(port);
   if (data_of(port)->pullup_when_supervised && io_port_direction_input(port)) {
     levels.io_ctrl = true;
@@ -95,8 +95,8 @@ bool read_line(IOPort *port, bool fresh, SupervisedRangeState *state, std::uint3
 
 gboolean read_again(gpointer user_data);
 
-// A document that asks for no pause at all would keep the main loop from sleeping.
-void read_later(IOPort *port, IioIntSupervisedData *data) {
+// Without a pause the main loop would never sleep.
+void schedule_read(IOPort *port, IioIntSupervisedData *data) {
   const guint pause = data->limit_timeout != 0 ? data->limit_timeout : kDefaultLimitTimeout;
   data->limit_timer = Source(g_timeout_add(pause, read_again, port));
 }
@@ -106,17 +106,17 @@ bool at_limit(const IioIntSupervisedData &data, std::int32_t value) {
          (data.upper_limit != kNoLimit && value >= data.upper_limit);
 }
 
-// A level that has moved on while its thresholds were set crosses none of them any more, and a
-// state that was new only to the thresholds is one that nobody was told.
-bool must_look_again(IioIntSupervisedData *data, const SupervisedRange &range) {
-  const bool untold =
+// A level that moved while its thresholds were set may never cross them, and a state that was first
+// seen by the thresholds has not been reported.
+bool needs_another_read(IioIntSupervisedData *data, const SupervisedRange &range) {
+  const bool unreported =
       data->last_state != SUPERVISED_STATE_UNDEFINED && data->last_state != range.state;
-  return untold || !iio_channel_read(data, nullptr) ||
+  return unreported || !iio_channel_read(data, nullptr) ||
          !supervised_find_range({range}, static_cast<std::uint32_t>(data->value.load()));
 }
 
-// Where no threshold can be set the level is read again after a while: it would be the last one
-// that is ever read otherwise. False: the level can't be read, or its thresholds can't be set.
+// Where no threshold can be set the level is read again after a while. False: the level can't be
+// read, or its thresholds can't be set.
 bool arm(IOPort *port) {
   IioIntSupervisedData *data = data_of(port);
   SupervisedRanges ranges;
@@ -131,23 +131,23 @@ bool arm(IOPort *port) {
   const SupervisedRange *range =
       supervised_find_range(ranges, static_cast<std::uint32_t>(data->value.load()));
   if (!range || at_limit(*data, data->value)) {
-    read_later(port, data);
+    schedule_read(port, data);
     return true;
   }
   if (!apply_thresholds(&data->files, plan_thresholds(*range, data->rules))) {
     return false;
   }
-  if (readable_again || must_look_again(data, *range)) {
-    read_later(port, data);
+  if (readable_again || needs_another_read(data, *range)) {
+    schedule_read(port, data);
   }
   return true;
 }
 
-void arm_or_try_later(IOPort *port) {
+void arm_or_retry(IOPort *port) {
   if (arm(port)) {
     data_of(port)->retry.stop();
   } else {
-    iio_try_later(port);
+    iio_retry_later(port);
   }
 }
 
@@ -167,7 +167,7 @@ gboolean read_again(gpointer user_data) {
   if (error) {
     log_critical("Unable to read from port %s\n", io_port_get_name(port).value_or("").c_str());
   }
-  arm_or_try_later(port);
+  arm_or_retry(port);
   return G_SOURCE_REMOVE;
 }
 
@@ -177,14 +177,14 @@ void on_event(IOPort *port) {
   if (error) {
     log_critical("Readout failed: %s", error.message());
   }
-  arm_or_try_later(port);
+  arm_or_retry(port);
 }
 
 void on_lost(IOPort *port) {
   IioIntSupervisedData *data = data_of(port);
   data->limit_timer.reset();
   data->unreadable = true;
-  iio_try_later(port);
+  iio_retry_later(port);
   supervised_report_state(port, SUPERVISED_STATE_UNDEFINED);
 }
 
@@ -220,7 +220,7 @@ bool set_supervised_ranges(IOPort *port, SupervisedRanges ranges, GError **error
   const IioIntSupervisedData *data = data_of(port);
   if (data->initialised && !data->retry && io_port_supervised_input(port)) {
     disable(port);
-    arm_or_try_later(port);
+    arm_or_retry(port);
   }
   return true;
 }
@@ -316,7 +316,7 @@ bool IioIntSupervisedData::setup_line(IOPort *port) {
   return false;
 }
 
-// Switched on again it begins anew: what could not be had before may be there now.
+// Starts from the beginning: a device that was missing may be there now.
 void IioIntSupervisedData::set_line_watch(IOPort *port, bool on) {
   limit_timer.reset();
   retry.stop();
@@ -328,11 +328,11 @@ void IioIntSupervisedData::set_line_watch(IOPort *port, bool on) {
   }
   last_state = SUPERVISED_STATE_UNDEFINED;
   if (is_gone()) {
-    (void)iio_try_now(port);
+    (void)iio_retry_now(port);
     return;
   }
   watch_events(port, *this);
-  arm_or_try_later(port);
+  arm_or_retry(port);
 }
 
 bool IioIntSupervisedData::is_gone() const {
@@ -369,7 +369,7 @@ bool IioIntSupervisedData::connect(IOPort *port) {
   return true;
 }
 
-// A level that still can't be read is not worth another message.
+// A level that still can't be read is not logged again.
 bool IioIntSupervisedData::resume(IOPort *port) {
   watch_events(port, *this);
   if (!iio_channel_is_readable(this)) {

@@ -174,7 +174,7 @@ bool supervised_drive_control_pins(IOPort *port, ControlLevels levels) {
   return false;
 }
 
-void supervised_demand_input(IOPort *port, const char *file, int line, const char *function) {
+void supervised_assert_input(IOPort *port, const char *file, int line, const char *function) {
   if (io_port_get_type(port) == PORT_OUTPUT) {
     g_assertion_message_expr(G_LOG_DOMAIN, file, line, function, "port->type == PORT_INPUT");
   }

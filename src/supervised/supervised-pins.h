@@ -31,10 +31,10 @@ bool supervised_set_pin_property(IOPort *port, const char *section, const char *
 // False, with a message, when it does not.
 bool supervised_check_pins(IOPort *port);
 // Requests the plain pins; an output starts at `initial_level`, or at 0 while the port acts as an
-// input. A pin that can't be had is logged and goes missing; set-up goes on.
+// input. A pin that is not available is logged, and set-up continues.
 void supervised_request_pins(IOPort *port, bool initial_level);
-// Requests the control pins. False, with a message, when sio_ctrl can't be had. Where it is
-// optional, not having one is fine.
+// Requests the control pins. False, with a message, when sio_ctrl is not available, unless
+// it is optional and not described.
 bool supervised_request_control_pins(IOPort *port, bool sio_ctrl_optional);
 
 struct ControlLevels {
@@ -47,7 +47,7 @@ struct ControlLevels {
 bool supervised_drive_control_pins(IOPort *port, ControlLevels levels);
 // Control pins are those of a port that can be an input. Any other is a programming error of the
 // caller, and ends the daemon with the caller's place in the message.
-void supervised_demand_input(IOPort *port, const char *file = __builtin_FILE(),
+void supervised_assert_input(IOPort *port, const char *file = __builtin_FILE(),
                              int line = __builtin_LINE(),
                              const char *function = __builtin_FUNCTION());
 // What they have to be by the common rule, for a port that can be an input.

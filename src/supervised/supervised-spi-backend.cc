@@ -39,7 +39,7 @@ SpiSupervisedData *data_of(IOPort *port) {
 }
 
 bool spi_set_control_pins(IOPort *port) {
-  supervised_demand_input(port);
+  supervised_assert_input(port);
   return supervised_drive_control_pins(port, supervised_control_levels(port));
 }
 

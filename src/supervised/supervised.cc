@@ -100,8 +100,8 @@ void supervised_update_watch(IOPort *port) {
   follow_line(port, io_port_supervised_input(port));
 }
 
-// Into an output the line leaves the input paths first; into an input it is let go of first. A pin
-// that refuses is logged.
+// To become an output, the line leaves the input paths before it is driven; to become an input, it
+// is no longer driven before it joins them. A pin that refuses is logged.
 void supervised_set_direction(IOPort *port, bool input) {
   SupervisedLine *line = line_of(port);
   if (!line->initialised) {

@@ -60,6 +60,6 @@ void supervised_report_state(IOPort *port, SupervisedRangeState state);
 // state is reported in any case; a readout that fails is logged and changes nothing.
 void supervised_set_poll(IOPort *port, bool on);
 
-// Adds the words for the states that a supervised port can tell apart, in the order that clients
-// know. Always true.
+// Adds the words for the states that a supervised port can tell apart. Fixed: their order. Always
+// true.
 bool supervised_supported_states(IOPort *port, std::vector<const char *> *states);

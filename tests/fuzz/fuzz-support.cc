@@ -8,7 +8,7 @@
 #include "base/glib-ptr.h"
 #include "base/unique-fd.h"
 #include "daemon/backends.h"
-#include "port/ioport.h"
+#include "port/ioport-private.h"
 #include "port/port-registry.h"
 #include "settings/param.h"
 
@@ -20,7 +20,7 @@ GLogWriterOutput drop_message(GLogLevelFlags /*level*/, const GLogField * /*fiel
 }
 
 bool owns_no_hardware(const IOPort *port) {
-  const BackendKind kind = io_port_get_backend(port);
+  const BackendKind kind = port->backend;
   return kind == BACKEND_VIRTUAL || kind == BACKEND_NULL || kind == BACKEND_CHECK;
 }
 

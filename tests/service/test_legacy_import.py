@@ -124,7 +124,7 @@ def assert_left_alone(device: Device, reason: str) -> None:
     begun = time.monotonic()
     device.start()
     assert time.monotonic() - begun < 5 * scale()
-    assert device.log_count(f"WARNING: portd: Left {EXPORT} alone: {reason}") == 1
+    assert device.log_count(f"WARNING: portd: Ignored {EXPORT}: {reason}") == 1
     assert Tool(device).get(0, INPUT, "Name") == "Input 1"
     assert device.path(EARLIER).exists()
 

@@ -11,7 +11,7 @@ LONGEST = "€" * (LIMIT // 3) + "x"
 TOO_LONG = LONGEST + "x"
 # As much as fits into a message: the signal that told of it would not fit into one.
 HUGE = "x" * 33_554_000
-LEFT_OUT = "WARNING: portd: Port gate: the input name is left out"
+IGNORED = "WARNING: portd: Port gate: the input name is ignored"
 
 
 @pytest.fixture
@@ -56,16 +56,16 @@ def test_a_stored_one_gives_way_to_the_default(gate):
     gate.start()
     assert gate.call("GetNames", "u", 0) == ("Input 1", "")
     assert gate.call("GetActive", "u", 0)[0] == "open"
-    assert gate.log_count(LEFT_OUT) == 1
+    assert gate.log_count(IGNORED) == 1
     gate.restart()
-    assert gate.log_count(LEFT_OUT) == 0
+    assert gate.log_count(IGNORED) == 0
 
 
 def test_one_of_the_hardware_description_gives_way_to_the_default(device):
     device.conf(hwdesc(port("gate", 0, names={"input": TOO_LONG})))
     device.start()
     assert device.call("GetNames", "u", 0) == ("Input 1", "")
-    assert device.log_count(LEFT_OUT) == 1
+    assert device.log_count(IGNORED) == 1
 
 
 def test_one_of_the_export_is_left_out(gate):

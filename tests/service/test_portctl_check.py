@@ -250,7 +250,7 @@ supervised_input=true
         ("uint32 200", "uint32 20", 17, 25, "lower < upper"),
         ("[relay]", "[relais]", 6, 1, 'no port is called "relais"'),
         ("pulse_time=0", "pulse_time", 10, 1, "malformed"),
-        ("input_activelow=false\n\n", "input_activelow=false\noutput_name=x\n", 5, 1, "means nothing"),
+        ("input_activelow=false\n\n", "input_activelow=false\noutput_name=x\n", 5, 1, "has no effect"),
     ],
 )  # fmt: skip
 def test_a_mistake_in_the_settings_is_found(conf, tmp_path, before, after, line, column, said):

@@ -101,12 +101,12 @@ def test_huge_arguments(full):
 
 def test_a_flood_of_calls_without_waiting(full):
     # Each of the first two thousand saves to storage, and the last reply waits for all of them.
-    patience = 120
+    timeout = 120
     pending = [
-        full.begin_call("SetState", "ub", 1, number % 2 == 0, timeout=patience)
+        full.begin_call("SetState", "ub", 1, number % 2 == 0, timeout=timeout)
         for number in range(2000)
-    ] + [full.begin_call("GetPortProps", timeout=patience) for _ in range(500)]
-    wait_for(lambda: all(call.done for call in pending), "all replies", patience)
+    ] + [full.begin_call("GetPortProps", timeout=timeout) for _ in range(500)]
+    wait_for(lambda: all(call.done for call in pending), "all replies", timeout)
     for call in pending:
         call.result()
     assert full.call("GetState", "u", 1) is False

@@ -133,7 +133,7 @@ def test_a_stop_does_not_wait_for_storage_that_hangs(device, storage):
     begun = time.monotonic()
     device.stop()
     assert time.monotonic() - begun < 5 * scale()
-    assert device.log_count("Storage hangs: the latest settings are lost") == 1
+    assert device.log_count("Storage does not respond: the latest settings are lost") == 1
     assert device.read_settings() == before
 
 

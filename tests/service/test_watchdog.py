@@ -99,5 +99,5 @@ def test_a_manager_that_can_not_be_reached_is_a_warning_and_no_more(device):
     device.conf(hwdesc(port("out", 0, "output")))
     device.environment = {"NOTIFY_SOCKET": "no path", "WATCHDOG_USEC": "100000"}
     device.start()
-    device.wait_log("The watchdog can't be answered at no path")
+    device.wait_log("Could not reach the watchdog at no path")
     device.call("GetNbrPorts")

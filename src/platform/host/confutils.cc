@@ -74,13 +74,13 @@ SyncedFiles &synced_files() {
   return *files;
 }
 
-void note_synced(const std::string &path, const struct stat &status) {
+void mark_synced(const std::string &path, const struct stat &status) {
   SyncedFiles &files = synced_files();
   const std::lock_guard lock(files.lock);
   files.versions.insert_or_assign(path, Version(status));
 }
 
-bool noted_as_synced(const std::string &path, const struct stat &status) {
+bool is_marked_synced(const std::string &path, const struct stat &status) {
   SyncedFiles &files = synced_files();
   const std::lock_guard lock(files.lock);
   const auto found = files.versions.find(path);
@@ -92,16 +92,16 @@ bool is_of_this_run(const timespec &time) {
   return !is_before(time, kProcessStart) && !is_before(time_by(CLOCK_REALTIME), time);
 }
 
-// What has lain there since before the process started is taken to be on storage: whoever wrote it
-// is gone, and the daemon has lived by it. From then on it is known by more than its times.
+// A file from before the start of the process is taken to be on storage. From then on it is known
+// by more than its times.
 bool is_synced(const std::string &path, const struct stat &status) {
-  if (noted_as_synced(path, status)) {
+  if (is_marked_synced(path, status)) {
     return true;
   }
   if (is_of_this_run(status.st_mtim) || is_of_this_run(status.st_ctim)) {
     return false;
   }
-  note_synced(path, status);
+  mark_synced(path, status);
   return true;
 }
 
@@ -131,7 +131,7 @@ bool write_all(int fd, std::string_view data) {
 }
 
 // The service account can't give a file to root: what it writes then stays its own.
-bool take_over_owner_and_mode(int fd, const struct stat &old) {
+bool copy_owner_and_mode(int fd, const struct stat &old) {
   if (fchown(fd, old.st_uid, old.st_gid) != 0 && errno != EPERM) {
     return false;
   }
@@ -140,7 +140,7 @@ bool take_over_owner_and_mode(int fd, const struct stat &old) {
 
 // `old`: what is to be replaced.
 bool write_temporary(int fd, const struct stat *old, std::string_view data) {
-  const bool prepared = old ? take_over_owner_and_mode(fd, *old) : fchmod(fd, kModeOfNewFile) == 0;
+  const bool prepared = old ? copy_owner_and_mode(fd, *old) : fchmod(fd, kModeOfNewFile) == 0;
   return prepared && write_all(fd, data) && fsync(fd) == 0;
 }
 
@@ -173,7 +173,7 @@ bool replace(const std::string &target, const struct stat *old, std::string_view
   }
   struct stat status {};
   if (fstat(fd.get(), &status) == 0) {
-    note_synced(target, status);
+    mark_synced(target, status);
   }
   return true;
 }

@@ -15,9 +15,9 @@ constexpr const char *kIntrospection = R"xml(<node>
   </interface>
 </node>)xml";
 
-// A start-up declares and sends before the main loop runs, which is where the connection arrives;
-// that is to be heard. What piles up beyond this is not worth the memory.
-constexpr std::size_t kMaxWaiting = 1024;
+// Start-up declares and sends before the main loop runs, which is where the connection arrives.
+// Those signals are queued, up to this many for each producer.
+constexpr std::size_t kMaxQueued = 1024;
 
 // Nothing tells when a bus appears, so it is looked for.
 constexpr guint kRetrySeconds = 1;
@@ -31,7 +31,7 @@ struct Answer {
 using Answers = std::map<guint32, Answer>;
 
 // What the property callbacks say now. The lock is not held while they run.
-Answers ask_properties(const EventProducer &producer, EventLock &lock) {
+Answers query_properties(const EventProducer &producer, EventLock &lock) {
   LiveDeclarations asked;
   for (const auto &[id, live] : producer.declarations) {
     if (live.declaration.callback) {
@@ -41,20 +41,20 @@ Answers ask_properties(const EventProducer &producer, EventLock &lock) {
   lock.unlock();
   Answers answers;
   for (const auto &[id, live] : asked) {
-    answers.emplace(id, Answer{ask_property(live.declaration), live.sends});
+    answers.emplace(id, Answer{query_property(live.declaration), live.sends});
   }
   lock.lock();
   return answers;
 }
 
-// An event that was sent after the callback was asked knows better than the callback did.
+// An event that was sent after the callback was called has newer values.
 GVariant *describe(guint32 id, const LiveDeclaration &live, const Answers &answers) {
   const auto answer = answers.find(id);
   if (answer == answers.end() || answer->second.sends != live.sends) {
     return declaration_to_variant(live.declaration);
   }
   EventDeclaration current = live.declaration;
-  take_values(current.inspectable, answer->second.values);
+  merge_values(current.inspectable, answer->second.values);
   return declaration_to_variant(current);
 }
 
@@ -67,7 +67,7 @@ GVariant *describe_all(const EventProducer &producer, const Answers &answers) {
   return g_variant_new("(a(ua{sv}))", &builder);
 }
 
-// The reply goes out under the lock as well: whoever gets it can tell which signals are newer.
+// The reply is sent under the lock too, so that it is in order with the signals.
 void on_method_call(GDBusConnection * /*connection*/, const gchar * /*sender*/,
                     const gchar *object_path, const gchar * /*interface_name*/,
                     const gchar * /*method_name*/, GVariant * /*parameters*/,
@@ -81,7 +81,7 @@ void on_method_call(GDBusConnection * /*connection*/, const gchar * /*sender*/,
     return;
   }
   const auto producer = found->second;
-  const Answers answers = ask_properties(*producer, lock);
+  const Answers answers = query_properties(*producer, lock);
   g_dbus_method_invocation_return_value(invocation, describe_all(*producer, answers));
 }
 
@@ -89,7 +89,7 @@ constexpr GDBusInterfaceVTable kVtable = {
     .method_call = on_method_call, .get_property = nullptr, .set_property = nullptr, .padding = {}};
 
 void emit(const EventLibrary &library, const EventProducer &producer, const EventSignal &signal) {
-  // A connection that has closed has nobody at its other end who could miss the signal.
+  // A failure means that the connection is closed: there is no receiver.
   g_dbus_connection_emit_signal(library.connection.get(), nullptr, producer.path.c_str(),
                                 kInterface, signal.name, signal.parameters.get(), nullptr);
 }
@@ -113,41 +113,41 @@ void announce(const EventLibrary &library, const EventProducer &producer, const 
   }
 }
 
-// The object comes before the signals, so that whoever hears one can ask for the rest.
-void bring_up(const EventLibrary &library, EventProducer &producer, EventLock &lock) {
+// The object comes before the signals, so that List works for their receivers.
+void connect_producer(const EventLibrary &library, EventProducer &producer, EventLock &lock) {
   register_object(library, producer);
-  if (producer.unheard) {
-    const Answers answers = ask_properties(producer, lock);
+  if (producer.signals_lost) {
+    const Answers answers = query_properties(producer, lock);
     if (producer.users == 0) {
       return;
     }
     announce(library, producer, answers);
   }
-  for (const auto &signal : producer.waiting) {
+  for (const auto &signal : producer.queued) {
     emit(library, producer, signal);
   }
-  producer.waiting.clear();
-  producer.unheard = false;
+  producer.queued.clear();
+  producer.signals_lost = false;
   producer.on_bus = true;
 }
 
-void bring_up_all(const EventLibrary &library, EventLock &lock) {
-  std::vector<std::shared_ptr<EventProducer>> silent;
+void connect_producers(const EventLibrary &library, EventLock &lock) {
+  std::vector<std::shared_ptr<EventProducer>> unpublished;
   for (const auto &[path, producer] : library.producers) {
     if (!producer->on_bus && producer->registration == 0) {
-      silent.push_back(producer);
+      unpublished.push_back(producer);
     }
   }
-  for (const auto &producer : silent) {
+  for (const auto &producer : unpublished) {
     if (producer->users != 0) {
-      bring_up(library, *producer, lock);
+      connect_producer(library, *producer, lock);
     }
   }
 }
 
-void stop_waiting(EventProducer &producer) {
-  producer.waiting.clear();
-  producer.unheard = true;
+void drop_queued(EventProducer &producer) {
+  producer.queued.clear();
+  producer.signals_lost = true;
 }
 
 void on_bus(GObject *source, GAsyncResult *result, gpointer user_data);
@@ -157,7 +157,7 @@ gboolean on_wake(gpointer /*user_data*/) {
   EventLock lock(library.lock);
   library.wake.reset();
   if (library.connection) {
-    bring_up_all(library, lock);
+    connect_producers(library, lock);
   } else if (!library.producers.empty() && !library.connecting) {
     library.connecting = true;
     g_bus_get(G_BUS_TYPE_SYSTEM, nullptr, on_bus, nullptr);
@@ -166,18 +166,18 @@ gboolean on_wake(gpointer /*user_data*/) {
 }
 
 // Everything that is done with the connection is done in the main thread, which List comes to.
-void wake_main(EventLibrary &library, GSource *source) {
+void run_on_main(EventLibrary &library, GSource *source) {
   g_source_set_priority(source, G_PRIORITY_DEFAULT);
   g_source_set_callback(source, on_wake, nullptr, nullptr);
   g_source_attach(source, nullptr);
   library.wake.reset(source);
 }
 
-void keep_looking(EventLibrary &library) {
+void retry_later(EventLibrary &library) {
   for (const auto &[path, producer] : library.producers) {
-    stop_waiting(*producer);
+    drop_queued(*producer);
   }
-  wake_main(library, g_timeout_source_new_seconds(kRetrySeconds));
+  run_on_main(library, g_timeout_source_new_seconds(kRetrySeconds));
 }
 
 void on_bus(GObject * /*source*/, GAsyncResult *result, gpointer /*user_data*/) {
@@ -192,22 +192,22 @@ void on_bus(GObject * /*source*/, GAsyncResult *result, gpointer /*user_data*/) 
   const bool was_missing = std::exchange(library.missing, !connection);
   if (connection) {
     library.connection = std::move(connection);
-    bring_up_all(library, lock);
+    connect_producers(library, lock);
     return;
   }
-  keep_looking(library);
+  retry_later(library);
   lock.unlock();
   if (!was_missing) {
-    log_info("Events are not heard until there is a system bus: %s", error.message());
+    log_info("Events are not published until there is a system bus: %s", error.message());
   }
 }
 
 }  // namespace
 
 void event_bus_publish(EventLibrary &library, EventProducer &producer) {
-  producer.unheard = library.missing;
+  producer.signals_lost = library.missing;
   if (!library.wake && !library.connecting) {
-    wake_main(library, g_idle_source_new());
+    run_on_main(library, g_idle_source_new());
   }
 }
 
@@ -217,7 +217,7 @@ void event_bus_withdraw(EventLibrary &library, EventProducer &producer) {
                                         std::exchange(producer.registration, 0));
   }
   producer.on_bus = false;
-  producer.waiting.clear();
+  producer.queued.clear();
   if (library.producers.empty()) {
     library.wake.reset();
     library.connection.reset();
@@ -230,10 +230,10 @@ void event_bus_signal(const EventLibrary &library, EventProducer &producer, cons
   EventSignal signal{name, GVariantPtr(g_variant_ref_sink(parameters))};
   if (producer.on_bus) {
     emit(library, producer, signal);
-  } else if (!producer.unheard) {
-    producer.waiting.push_back(std::move(signal));
-    if (producer.waiting.size() > kMaxWaiting) {
-      stop_waiting(producer);
+  } else if (!producer.signals_lost) {
+    producer.queued.push_back(std::move(signal));
+    if (producer.queued.size() > kMaxQueued) {
+      drop_queued(producer);
     }
   }
 }

@@ -42,6 +42,16 @@ gboolean set_value(Inspectable *inspectable, const gchar *name, std::optional<Ev
   return TRUE;
 }
 
+gboolean set_key_text(EventDeclaration *declaration, const gchar *key,
+                      std::optional<std::string> EventKey::*member, const gchar *text) {
+  EventKey *entry = is_text(text) ? key_for(declaration, key) : nullptr;
+  if (!entry) {
+    return FALSE;
+  }
+  entry->*member = text;
+  return TRUE;
+}
+
 bool is_nice_name(const gchar *name) {
   return !name || is_text(name);
 }
@@ -97,22 +107,12 @@ gboolean event_declaration_set_nice_names(EventDeclaration *declaration, const g
 
 gboolean event_declaration_set_namespace(EventDeclaration *declaration, const gchar *key,
                                          const gchar *name_space) {
-  EventKey *entry = is_text(name_space) ? key_for(declaration, key) : nullptr;
-  if (!entry) {
-    return FALSE;
-  }
-  entry->name_space = name_space;
-  return TRUE;
+  return set_key_text(declaration, key, &EventKey::name_space, name_space);
 }
 
 gboolean event_declaration_set_key_tag(EventDeclaration *declaration, const gchar *key,
                                        const gchar *tag) {
-  EventKey *entry = is_text(tag) ? key_for(declaration, key) : nullptr;
-  if (!entry) {
-    return FALSE;
-  }
-  entry->tag = tag;
-  return TRUE;
+  return set_key_text(declaration, key, &EventKey::tag, tag);
 }
 
 gboolean event_declaration_set_property(EventDeclaration *declaration, const gchar *key,

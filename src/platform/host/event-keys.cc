@@ -70,17 +70,17 @@ std::optional<EventValue> value_from_text(gint type, const gchar *text) {
   }
 }
 
-Inspectable blank_inspectable(const Inspectable &declared) {
-  Inspectable blank;
+Inspectable empty_inspectable(const Inspectable &declared) {
+  Inspectable empty;
   for (const auto &key : declared.keys) {
-    EventKey &copy = blank.keys.emplace_back();
+    EventKey &copy = empty.keys.emplace_back();
     copy.name = key.name;
     copy.type = key.type;
   }
-  return blank;
+  return empty;
 }
 
-bool take_values(Inspectable &into, const Inspectable &values) {
+bool merge_values(Inspectable &into, const Inspectable &values) {
   const bool agree =
       std::equal(values.keys.begin(), values.keys.end(), into.keys.begin(), into.keys.end(),
                  [](const EventKey &from, const EventKey &to) {
@@ -100,8 +100,8 @@ bool take_values(Inspectable &into, const Inspectable &values) {
   return true;
 }
 
-Inspectable ask_property(const EventDeclaration &declaration) {
-  Inspectable values = blank_inspectable(declaration.inspectable);
+Inspectable query_property(const EventDeclaration &declaration) {
+  Inspectable values = empty_inspectable(declaration.inspectable);
   if (declaration.callback) {
     declaration.callback(&values, declaration.user_data);
   }

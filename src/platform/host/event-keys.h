@@ -60,11 +60,11 @@ bool is_key_type(gint type);
 std::optional<EventValue> value_from_text(gint type, const gchar *text);
 
 // The keys alone, for an event or a property callback to fill in.
-Inspectable blank_inspectable(const Inspectable &declared);
+Inspectable empty_inspectable(const Inspectable &declared);
 
 // Takes over what is set in `values`. False, and nothing is taken over: the two disagree on the
 // type of a key. Both hold the same keys in the same order.
-bool take_values(Inspectable &into, const Inspectable &values);
+bool merge_values(Inspectable &into, const Inspectable &values);
 
 // What the property callback says now; nothing set when there is none. With no lock held.
-Inspectable ask_property(const EventDeclaration &declaration);
+Inspectable query_property(const EventDeclaration &declaration);

@@ -30,10 +30,10 @@ struct EventProducer : std::enable_shared_from_this<EventProducer> {
   guint32 last_id = 0;
   LiveDeclarations declarations;
 
-  guint registration = 0;            // of the object; 0: none
-  bool on_bus = false;               // signals go out as they come
-  std::vector<EventSignal> waiting;  // for the connection that is being made
-  bool unheard = false;              // signals were lost, so the declarations must be announced
+  guint registration = 0;           // of the object; 0: none
+  bool on_bus = false;              // signals go out as they come
+  std::vector<EventSignal> queued;  // until there is a connection
+  bool signals_lost = false;        // signals were lost, so the declarations must be announced
 };
 
 inline void destroy_source(GSource *source) {

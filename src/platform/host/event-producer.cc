@@ -100,7 +100,7 @@ guint32 event_producer_declare(EventProducer *producer, const EventDeclaration *
     return 0;
   }
   EventDeclaration copy = *declaration;
-  take_values(copy.inspectable, ask_property(copy));
+  merge_values(copy.inspectable, query_property(copy));
   auto &library = event_library();
   const EventLock lock(library.lock);
   const guint32 id = unused_id(*producer);
@@ -135,7 +135,7 @@ Event *event_producer_prepare_event(EventProducer *producer, guint32 id) {
   auto event = std::make_unique<Event>();
   event->producer = producer->weak_from_this();
   event->id = id;
-  event->values = blank_inspectable(live->second.declaration.inspectable);
+  event->values = empty_inspectable(live->second.declaration.inspectable);
   return event.release();
 }
 
@@ -151,7 +151,7 @@ gboolean event_producer_send_event(EventProducer *producer, const Event *event, 
   }
   auto &[id, live] = *found;
   Inspectable &current = live.declaration.inspectable;
-  if (!take_values(current, event->values)) {
+  if (!merge_values(current, event->values)) {
     return fail(error, G_IO_ERROR_INVALID_ARGUMENT, "A value is not of the type of its key");
   }
   ++live.sends;

@@ -32,7 +32,8 @@ bool prints_to_journal() {
 }
 
 std::string describe_loss(std::uint64_t count) {
-  const std::string text = std::to_string(count) + " log lines were lost: nobody read them";
+  const std::string text =
+      std::to_string(count) + " log lines were lost: standard output was blocked";
   return log_line({G_LOG_LEVEL_WARNING, G_LOG_DOMAIN, text}, prints_to_journal());
 }
 

@@ -10,7 +10,7 @@ struct LogMessage {
   std::string_view text;
 };
 
-// Whether whoever reads this descriptor understands a level at the start of a line, as the journal
+// Whether the reader of this descriptor understands a level at the start of a line, as the journal
 // does. The journal's service names the stream that it has opened for a process in the variable
 // JOURNAL_STREAM, as "DEVICE:INODE"; a descriptor that was redirected later is another file.
 bool is_journal_stream(int descriptor, const char *journal_stream);

@@ -13,7 +13,7 @@
 namespace {
 
 // Long enough for a reader that is busy, short enough for callers on the bus.
-constexpr int kPatienceMs = 100;
+constexpr int kWriteTimeoutMs = 100;
 constexpr std::int64_t kMicrosecondsPerMs = 1000;
 
 // Waits until the reader takes something.
@@ -38,8 +38,8 @@ ssize_t write_some(int fd, std::string_view text) {
 
 }  // namespace
 
-bool LogStream::put(std::string_view text, int patience_ms) {
-  const std::int64_t deadline_us = g_get_monotonic_time() + patience_ms * kMicrosecondsPerMs;
+bool LogStream::write_before(std::string_view text, int timeout_ms) {
+  const std::int64_t deadline_us = g_get_monotonic_time() + timeout_ms * kMicrosecondsPerMs;
   const std::size_t whole = text.size();
   while (!text.empty() && wait_writable(fd_, deadline_us)) {
     const ssize_t written = write_some(fd_, text);
@@ -49,20 +49,20 @@ bool LogStream::put(std::string_view text, int patience_ms) {
       break;
     }
   }
-  cut_ = cut_ || (!text.empty() && text.size() < whole);
+  truncated_ = truncated_ || (!text.empty() && text.size() < whole);
   return text.empty();
 }
 
 void LogStream::write_line(const std::string &line) {
   const std::lock_guard lock(lock_);
-  const int patience_ms = lost_ == 0 ? kPatienceMs : 0;
-  if (cut_ && put("\n", patience_ms)) {
-    cut_ = false;
+  const int timeout_ms = lost_ == 0 ? kWriteTimeoutMs : 0;
+  if (truncated_ && write_before("\n", timeout_ms)) {
+    truncated_ = false;
   }
-  if (lost_ > 0 && !cut_ && put(describe_loss_(lost_), patience_ms)) {
+  if (lost_ > 0 && !truncated_ && write_before(describe_loss_(lost_), timeout_ms)) {
     lost_ = 0;
   }
-  if (lost_ > 0 || cut_ || !put(line, patience_ms)) {
+  if (lost_ > 0 || truncated_ || !write_before(line, timeout_ms)) {
     ++lost_;
   }
 }

@@ -17,11 +17,11 @@ class LogStream {
   void write_line(const std::string &line);
 
  private:
-  bool put(std::string_view text, int patience_ms);
+  bool write_before(std::string_view text, int timeout_ms);
 
   const int fd_;
   std::string (*const describe_loss_)(std::uint64_t count);
   std::mutex lock_;
   std::uint64_t lost_ = 0;
-  bool cut_ = false;  // the last line that was written lacks its end
+  bool truncated_ = false;  // the last line that was written lacks its end
 };

@@ -20,7 +20,7 @@ struct Ugpio {
   bool exported = false;  // by this context, so it takes the export back
   bool input = false;
   // Until then (monotonic, in microseconds) a missing or forbidden file is waited for.
-  gint64 settle_deadline = 0;
+  gint64 open_deadline = 0;
   bool complete = false;  // one of the files was there, so that a missing one stays missing
   UniqueFd value;
 };
@@ -29,8 +29,8 @@ namespace {
 
 // The kernel has the files of an exported line ready at once. The rights that a rule of the device
 // manager gives to them come a moment later.
-constexpr gint64 kSettleTime = 500 * G_TIME_SPAN_MILLISECOND;
-constexpr gulong kSettlePoll = G_TIME_SPAN_MILLISECOND;
+constexpr gint64 kOpenTimeout = 500 * G_TIME_SPAN_MILLISECOND;
+constexpr gulong kOpenRetryInterval = G_TIME_SPAN_MILLISECOND;
 
 constexpr std::size_t kAttributeSize = 64;
 
@@ -40,12 +40,12 @@ std::string &root() {
 }
 
 // Cleaning up after a failure must not hide why it failed.
-class ErrnoKeeper {
+class ErrnoGuard {
  public:
-  ErrnoKeeper() = default;
-  ErrnoKeeper(const ErrnoKeeper &) = delete;
-  ErrnoKeeper &operator=(const ErrnoKeeper &) = delete;
-  ~ErrnoKeeper() { errno = errno_; }
+  ErrnoGuard() = default;
+  ErrnoGuard(const ErrnoGuard &) = delete;
+  ErrnoGuard &operator=(const ErrnoGuard &) = delete;
+  ~ErrnoGuard() { errno = errno_; }
 
  private:
   int errno_ = errno;
@@ -75,7 +75,7 @@ std::string line_path(const ugpio_t &context) {
 
 // Callers say which line failed; only here it is known why.
 void explain(const std::string &action, const std::string &path) {
-  const ErrnoKeeper keeper;
+  const ErrnoGuard keeper;
   log_warning("Can't %s %s: %s", action.c_str(), path.c_str(), g_strerror(errno));
 }
 
@@ -83,16 +83,16 @@ UniqueFd open_file(const std::string &path, int flags) {
   return UniqueFd(uninterrupted([&] { return open(path.c_str(), flags | O_CLOEXEC); }));
 }
 
-bool may_settle(const ugpio_t &context, int code) {
+bool may_retry_open(const ugpio_t &context, int code) {
   const bool may_change = code == EACCES || (code == ENOENT && !context.complete);
-  return may_change && g_get_monotonic_time() < context.settle_deadline;
+  return may_change && g_get_monotonic_time() < context.open_deadline;
 }
 
 UniqueFd open_attribute(ugpio_t &context, const char *name, int flags) {
   const std::string path = line_path(context) + "/" + name;
   UniqueFd fd = open_file(path, flags);
-  while (!fd && may_settle(context, errno)) {
-    g_usleep(kSettlePoll);
+  while (!fd && may_retry_open(context, errno)) {
+    g_usleep(kOpenRetryInterval);
     fd = open_file(path, flags);
   }
   context.complete = context.complete || fd;
@@ -140,7 +140,7 @@ bool export_line(ugpio_t &context) {
   }
   if (write_number("export", context.number)) {
     context.exported = true;
-    context.settle_deadline = g_get_monotonic_time() + kSettleTime;
+    context.open_deadline = g_get_monotonic_time() + kOpenTimeout;
     return true;
   }
   // Busy may also mean that another process exported the line since we looked.
@@ -153,9 +153,9 @@ bool export_line(ugpio_t &context) {
   return false;
 }
 
-struct GiveBack {
+struct ReleaseLine {
   void operator()(ugpio_t *context) const {
-    const ErrnoKeeper keeper;
+    const ErrnoGuard keeper;
     context->value.reset();
     // EINVAL: the line went away with its chip.
     if (context->exported && !write_number("unexport", context->number) && errno != EINVAL) {
@@ -165,9 +165,9 @@ struct GiveBack {
     delete context;
   }
 };
-using ContextPtr = std::unique_ptr<ugpio_t, GiveBack>;
+using ContextPtr = std::unique_ptr<ugpio_t, ReleaseLine>;
 
-ContextPtr take(unsigned int gpio) {
+ContextPtr request_line(unsigned int gpio) {
   ContextPtr context(new ugpio_t);
   context->number = gpio;
   if (!export_line(*context)) {
@@ -196,7 +196,7 @@ bool set_edges(ugpio_t &context, unsigned int flags) {
     explain("write", line_path(context) + "/edge");
     return false;
   }
-  log_warning("GPIO %u can't signal edges: its changes go unseen", context.number);
+  log_warning("GPIO %u has no edge interrupts: its changes are not detected", context.number);
   return true;
 }
 
@@ -289,7 +289,7 @@ std::optional<std::string> ugpio_host_read_file(const std::string &path) {
 }
 
 ugpio_t *ugpio_request(unsigned int gpio, const char * /*label*/) {
-  return take(gpio).release();
+  return request_line(gpio).release();
 }
 
 ugpio_t *ugpio_request_named(const char *name) {
@@ -298,7 +298,7 @@ ugpio_t *ugpio_request_named(const char *name) {
 }
 
 ugpio_t *ugpio_request_one(unsigned int gpio, unsigned int flags, const char * /*label*/) {
-  ContextPtr context = take(gpio);
+  ContextPtr context = request_line(gpio);
   if (context && !configure(*context, flags)) {
     context.reset();
   }

@@ -17,10 +17,10 @@ std::string read_file(const std::string &path) {
   Error error;
   // Reading a pipe or a device could go on for ever.
   if (!g_file_test(path.c_str(), G_FILE_TEST_IS_REGULAR)) {
-    fail(kUsage, visible(path) + " is no file");
+    fail(STATUS_USAGE, visible(path) + " is no file");
   }
   if (!g_file_get_contents(path.c_str(), &contents, &length, error.out())) {
-    fail(kUsage, visible(error.message()));
+    fail(STATUS_USAGE, visible(error.message()));
   }
   const GCharPtr owned(contents);
   return {contents, length};
@@ -91,7 +91,7 @@ int report(const Session &session, const Findings &findings) {
   if (session.options.json) {
     std::printf("%s\n", array.text().c_str());
   }
-  return bad ? kRefused : kOk;
+  return bad ? STATUS_REFUSED : STATUS_OK;
 }
 
 }  // namespace

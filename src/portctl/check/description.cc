@@ -84,7 +84,7 @@ void DescriptionChecker::end() {
 
 void DescriptionChecker::text(const Place &place) {
   const bool in_number = !open_.empty() && open_.back() == "port_no";
-  findings_.error(place, std::string("text between tags means nothing, it is ignored: write ") +
+  findings_.error(place, std::string("text between tags is ignored: write ") +
                              (in_number ? "<port_no nbr=\"...\"/>"
                                         : "values as attributes, and remarks in <!-- -->"));
 }
@@ -233,7 +233,7 @@ void DescriptionChecker::apply_flags(const DocumentElement &element) {
     const auto near = flag ? std::string_view() : nearest(attribute.name, names);
     if (!near.empty()) {
       findings_.error(attribute.place, "the flag " + quoted(attribute.name) +
-                                           " means nothing to the daemon; did you mean " +
+                                           " is unknown to the daemon; did you mean " +
                                            quoted(near) + "?");
     }
     constexpr vocabulary::Attribute any_flag = {.name = "flag", .type = vocabulary::Type::kSwitch};

@@ -91,7 +91,7 @@ void DescriptionChecker::check_spiadc_range(const DocumentElement &element) {
   } else if (element.attributes[0].name != "nbr") {
     findings_.warning(element.attributes[0].place,
                       "the value of " + quoted(element.attributes[0].name) +
-                          " means nothing: limits are active_min and active_max of the <input> "
+                          " has no effect: limits are active_min and active_max of the <input> "
                           "that follows");
   }
 }

@@ -223,7 +223,7 @@ void check_entry(const Group &group, const Entry &entry, const DescribedPort &po
     return;
   }
   if (!applies(*setting, port)) {
-    findings.warning(entry.place, entry.key + " means nothing for the port " + quoted(group.name) +
+    findings.warning(entry.place, entry.key + " has no effect on the port " + quoted(group.name) +
                                       ", it is ignored");
     return;
   }
@@ -260,7 +260,7 @@ void check_group(const Group &group, const std::vector<DescribedPort> &ports, Fi
   }
   if (!group.name.starts_with(kTriggerPrefix)) {
     findings.warning(group.place, "no port is called " + quoted(group.name) +
-                                      ", the group is kept but means nothing" +
+                                      ", the group is kept but has no effect" +
                                       suggestion(group.name, names));
   }
 }

@@ -23,7 +23,7 @@ class GpioEdges : public DeviceTest {
   void toggle(int line) { sim_.pull(line, levels_[line] = !levels_[line]); }
 
   // The daemon's last word on each port that moved, and its answer, are the line's level.
-  void expect_settled() {
+  void expect_one_report() {
     for (int i = 0; i < kInputs; ++i) {
       if (client_.count_changes(i) > 0) {
         EXPECT_TRUE(reports(i, levels_[i]));
@@ -72,7 +72,7 @@ TEST_F(GpioEdges, BurstsOnSeveralLinesAtOnce) {
   for (int line = 0; line < kInputs; ++line) {
     EXPECT_TRUE(reports(line, true)) << "line " << line;
   }
-  expect_settled();
+  expect_one_report();
 }
 
 // A client's question reads the line as well and so takes the edge away from the watch.
@@ -89,7 +89,7 @@ TEST_F(GpioEdges, RestCostsNothing) {
   for (int i = 0; i < 50; ++i) {
     toggle(3);
   }
-  expect_settled();
+  expect_one_report();
   EXPECT_LE(daemon_.load_percent(kIdleTime), kIdlePercent);
 }
 

@@ -16,8 +16,8 @@ constexpr mode_t kAnybodyMayWrite = 0222;
 constexpr mode_t kRootMayWrite = 0200;
 constexpr int kIdleTime = 1000;  // milliseconds
 
-enum Line { kLost, kHeld };
-enum Kept { kKept };
+enum Line { LINE_LOST, LINE_HELD };
+enum Kept { KEPT_LINE };
 
 // The line is somebody else's while this lives, as a driver's would be.
 class HeldLine {
@@ -41,11 +41,11 @@ class GpioLost : public DeviceTest {
   std::string lost_and_kept(bool optional) const {
     return port_element("lost", 0, "input", "gpio", "<input alias='lost'/>", optional) +
            port_element("kept", 1, "input", "gpio",
-                        "<input pin='" + kept_.number_text(kKept) + "'/>");
+                        "<input pin='" + kept_.number_text(KEPT_LINE) + "'/>");
   }
   void expect_kept_works() {
-    const bool level = !kept_.level(kKept);
-    kept_.pull(kKept, level);
+    const bool level = !kept_.level(KEPT_LINE);
+    kept_.pull(KEPT_LINE, level);
     EXPECT_TRUE(reports(1, level));
   }
 
@@ -54,11 +54,12 @@ class GpioLost : public DeviceTest {
 };
 
 TEST_F(GpioLost, ALineThatIsInUseIsLoggedAndTheOtherPortsWork) {
-  const HeldLine held(sim_.chip(), kHeld);
-  start(
-      port_element("busy", 0, "output", "gpio", "<output pin='" + sim_.number_text(kHeld) + "'/>") +
-      port_element("kept", 1, "input", "gpio", "<input pin='" + kept_.number_text(kKept) + "'/>"));
-  EXPECT_TRUE(Daemon::logged("Failed to allocate pin " + sim_.number_text(kHeld) + "/(null)"));
+  const HeldLine held(sim_.chip(), LINE_HELD);
+  start(port_element("busy", 0, "output", "gpio",
+                     "<output pin='" + sim_.number_text(LINE_HELD) + "'/>") +
+        port_element("kept", 1, "input", "gpio",
+                     "<input pin='" + kept_.number_text(KEPT_LINE) + "'/>"));
+  EXPECT_TRUE(Daemon::logged("Failed to allocate pin " + sim_.number_text(LINE_HELD) + "/(null)"));
   // Answered like any other, logged, and not a crash.
   EXPECT_EQ(client_.set_state(0, true), "");
   EXPECT_TRUE(Daemon::logged("Failed to set state on port!"));
@@ -66,16 +67,16 @@ TEST_F(GpioLost, ALineThatIsInUseIsLoggedAndTheOtherPortsWork) {
 }
 
 TEST_F(GpioLost, ALineThatDoesNotExistIsLoggedAndTheOtherPortsWork) {
-  start(
-      port_element("none", 0, "input", "gpio", "<input alias='no-such-line'/>") +
-      port_element("kept", 1, "input", "gpio", "<input pin='" + kept_.number_text(kKept) + "'/>"));
+  start(port_element("none", 0, "input", "gpio", "<input alias='no-such-line'/>") +
+        port_element("kept", 1, "input", "gpio",
+                     "<input pin='" + kept_.number_text(KEPT_LINE) + "'/>"));
   EXPECT_TRUE(Daemon::logged("Failed to allocate pin 0/no-such-line"));
   EXPECT_TRUE(client_.state(0));  // a line that can't be read counts as active
   expect_kept_works();
 }
 
 TEST_F(GpioLost, ALineRemovedWhileWatchedCostsNothing) {
-  sim_.pull(kLost, false);
+  sim_.pull(LINE_LOST, false);
   start(lost_and_kept(false));
   EXPECT_FALSE(client_.state(0));
   sim_.unplug();
@@ -85,9 +86,9 @@ TEST_F(GpioLost, ALineRemovedWhileWatchedCostsNothing) {
 }
 
 TEST_F(GpioLost, AnOutputRemovedWhileOnAnswersOn) {
-  start(
-      port_element("out", 0, "output", "gpio", "<output alias='lost'/>") +
-      port_element("kept", 1, "input", "gpio", "<input pin='" + kept_.number_text(kKept) + "'/>"));
+  start(port_element("out", 0, "output", "gpio", "<output alias='lost'/>") +
+        port_element("kept", 1, "input", "gpio",
+                     "<input pin='" + kept_.number_text(KEPT_LINE) + "'/>"));
   EXPECT_EQ(client_.set_state(0, true), "");
   sim_.unplug();
   EXPECT_EQ(client_.set_state(0, false), "");
@@ -101,14 +102,14 @@ TEST_F(GpioLost, ADroppedPortGivesItsLineBackIfItMay) {
   EXPECT_EQ(chmod("/sys/class/gpio/unexport", kAnybodyMayWrite), 0);
   EXPECT_EQ(client_.drop("lost"), std::vector<std::string>{"lost"});
   EXPECT_EQ(chmod("/sys/class/gpio/unexport", kRootMayWrite), 0);
-  const HeldLine held(sim_.chip(), kLost);
+  const HeldLine held(sim_.chip(), LINE_LOST);
   expect_kept_works();
 }
 
 TEST_F(GpioLost, ADroppedPortThatMayNotGiveItsLineBackSaysSo) {
   start(lost_and_kept(true));
   EXPECT_EQ(client_.drop("lost"), std::vector<std::string>{"lost"});
-  EXPECT_TRUE(Daemon::logged("Can't give GPIO " + sim_.number_text(kLost) +
+  EXPECT_TRUE(Daemon::logged("Can't give GPIO " + sim_.number_text(LINE_LOST) +
                              " back with /sys/class/gpio/unexport: " + g_strerror(EACCES)));
   expect_kept_works();
 }

@@ -5,7 +5,15 @@ namespace {
 
 using Entries = std::vector<std::string>;
 
-enum Line { kInput, kInverted, kOutput, kInvertedOutput, kTerminalIn, kTerminalOut, kTerminalCtrl };
+enum Line {
+  LINE_INPUT,
+  LINE_INVERTED,
+  LINE_OUTPUT,
+  LINE_INVERTED_OUTPUT,
+  LINE_TERMINAL_IN,
+  LINE_TERMINAL_OUT,
+  LINE_TERMINAL_CTRL
+};
 
 class Gpio : public DeviceTest {
  protected:
@@ -19,103 +27,104 @@ class Gpio : public DeviceTest {
 
   // Ports 0 and 1 are inputs, 2 and 3 outputs, the second of each inverted; 4 is configurable.
   std::string all_ports() const {
-    return port_element("in", 0, "input", "gpio", numbered("input", kInput)) +
-           port_element("in-inverted", 1, "input", "gpio", numbered("input", kInverted, true)) +
-           port_element("out", 2, "output", "gpio", numbered("output", kOutput)) +
+    return port_element("in", 0, "input", "gpio", numbered("input", LINE_INPUT)) +
+           port_element("in-inverted", 1, "input", "gpio", numbered("input", LINE_INVERTED, true)) +
+           port_element("out", 2, "output", "gpio", numbered("output", LINE_OUTPUT)) +
            port_element("out-inverted", 3, "output", "gpio",
-                        numbered("output", kInvertedOutput, true)) +
+                        numbered("output", LINE_INVERTED_OUTPUT, true)) +
            port_element("terminal", 4, "io_ctrl", "gpio",
-                        numbered("input", kTerminalIn) + numbered("output", kTerminalOut) +
-                            numbered("io_ctrl", kTerminalCtrl));
+                        numbered("input", LINE_TERMINAL_IN) +
+                            numbered("output", LINE_TERMINAL_OUT) +
+                            numbered("io_ctrl", LINE_TERMINAL_CTRL));
   }
   Entries terminal_history() const {
     return LineHistory::together(
-        {{sim_.number(kTerminalOut), "output"}, {sim_.number(kTerminalCtrl), "control"}});
+        {{sim_.number(LINE_TERMINAL_OUT), "output"}, {sim_.number(LINE_TERMINAL_CTRL), "control"}});
   }
 
   GpioSim sim_{"lines", {"", "", "", "", "term-in", "term-out", "term-ctrl"}};
 };
 
 TEST_F(Gpio, AnInputFollowsItsLine) {
-  sim_.pull(kInput, false);
+  sim_.pull(LINE_INPUT, false);
   start(all_ports());
   EXPECT_FALSE(client_.state(0));
-  sim_.pull(kInput, true);
+  sim_.pull(LINE_INPUT, true);
   EXPECT_TRUE(reports(0, true));
   EXPECT_TRUE(client_.state(0));
-  sim_.pull(kInput, false);
+  sim_.pull(LINE_INPUT, false);
   EXPECT_TRUE(reports(0, false));
   EXPECT_EQ(client_.count_changes(0), 2);
 }
 
 TEST_F(Gpio, AnInvertedInputIsActiveWhileTheLineIsLow) {
-  sim_.pull(kInverted, false);
+  sim_.pull(LINE_INVERTED, false);
   start(all_ports());
   EXPECT_TRUE(client_.state(1));
-  sim_.pull(kInverted, true);
+  sim_.pull(LINE_INVERTED, true);
   EXPECT_TRUE(reports(1, false));
-  sim_.pull(kInverted, false);
+  sim_.pull(LINE_INVERTED, false);
   EXPECT_TRUE(reports(1, true));
 }
 
 TEST_F(Gpio, TheUsersActiveLevelComesOnTopOfTheLines) {
-  sim_.pull(kInverted, false);
+  sim_.pull(LINE_INVERTED, false);
   start(all_ports());
   EXPECT_EQ(client_.set_activelow(1, true, true), "");
   EXPECT_TRUE(reports(1, false));
-  sim_.pull(kInverted, true);
+  sim_.pull(LINE_INVERTED, true);
   EXPECT_TRUE(reports(1, true));
 }
 
 TEST_F(Gpio, AnOutputDrivesItsLine) {
   start(all_ports());
-  EXPECT_FALSE(sim_.level(kOutput));
+  EXPECT_FALSE(sim_.level(LINE_OUTPUT));
   EXPECT_EQ(client_.set_state(2, true), "");
-  EXPECT_TRUE(sim_.level(kOutput));
+  EXPECT_TRUE(sim_.level(LINE_OUTPUT));
   EXPECT_TRUE(reports(2, true));
   EXPECT_EQ(client_.set_state(2, false), "");
-  EXPECT_FALSE(sim_.level(kOutput));
+  EXPECT_FALSE(sim_.level(LINE_OUTPUT));
   EXPECT_TRUE(reports(2, false));
 }
 
 TEST_F(Gpio, AnInvertedOutputIsActiveLow) {
   start(all_ports());
-  EXPECT_TRUE(sim_.level(kInvertedOutput));
+  EXPECT_TRUE(sim_.level(LINE_INVERTED_OUTPUT));
   EXPECT_EQ(client_.set_state(3, true), "");
-  EXPECT_FALSE(sim_.level(kInvertedOutput));
+  EXPECT_FALSE(sim_.level(LINE_INVERTED_OUTPUT));
   EXPECT_TRUE(client_.state(3));
 }
 
 TEST_F(Gpio, LinesAreFoundByTheirNames) {
   // The numbers are those of other lines, and must not count.
-  const std::string wrong = "' pin='" + sim_.number_text(kInput) + "'";
-  sim_.pull(kTerminalIn, true);
+  const std::string wrong = "' pin='" + sim_.number_text(LINE_INPUT) + "'";
+  sim_.pull(LINE_TERMINAL_IN, true);
   start(port_element("in", 0, "input", "gpio", pin("input", "alias='term-in" + wrong)) +
         port_element("out", 1, "output", "gpio", pin("output", "alias='term-out" + wrong)));
   EXPECT_TRUE(client_.state(0));
-  sim_.pull(kTerminalIn, false);
+  sim_.pull(LINE_TERMINAL_IN, false);
   EXPECT_TRUE(reports(0, false));
   EXPECT_EQ(client_.set_state(1, true), "");
-  EXPECT_TRUE(sim_.level(kTerminalOut));
+  EXPECT_TRUE(sim_.level(LINE_TERMINAL_OUT));
 }
 
 TEST_F(Gpio, AConfigurablePortSwitchesItsTerminal) {
-  sim_.pull(kTerminalIn, true);
+  sim_.pull(LINE_TERMINAL_IN, true);
   start(all_ports());
-  EXPECT_FALSE(sim_.level(kTerminalCtrl));
+  EXPECT_FALSE(sim_.level(LINE_TERMINAL_CTRL));
   EXPECT_TRUE(client_.state(4));
 
   EXPECT_EQ(client_.set_direction(4, "output"), "");
-  EXPECT_TRUE(sim_.level(kTerminalCtrl));
-  EXPECT_FALSE(sim_.level(kTerminalOut));
+  EXPECT_TRUE(sim_.level(LINE_TERMINAL_CTRL));
+  EXPECT_FALSE(sim_.level(LINE_TERMINAL_OUT));
   EXPECT_EQ(client_.set_state(4, true), "");
-  EXPECT_TRUE(sim_.level(kTerminalOut));
+  EXPECT_TRUE(sim_.level(LINE_TERMINAL_OUT));
 
   EXPECT_EQ(client_.set_direction(4, "input"), "");
-  EXPECT_FALSE(sim_.level(kTerminalCtrl));
-  EXPECT_FALSE(sim_.level(kTerminalOut));
+  EXPECT_FALSE(sim_.level(LINE_TERMINAL_CTRL));
+  EXPECT_FALSE(sim_.level(LINE_TERMINAL_OUT));
   client_.forget_changes();
-  sim_.pull(kTerminalIn, false);
+  sim_.pull(LINE_TERMINAL_IN, false);
   EXPECT_TRUE(reports(4, false));
 }
 
@@ -141,9 +150,9 @@ TEST_F(Gpio, ADirectionSurvivesARestart) {
   start(all_ports());
   EXPECT_EQ(client_.set_direction(4, "output"), "");
   restart();
-  EXPECT_TRUE(sim_.level(kTerminalCtrl));
+  EXPECT_TRUE(sim_.level(LINE_TERMINAL_CTRL));
   EXPECT_EQ(client_.set_state(4, true), "");
-  EXPECT_TRUE(sim_.level(kTerminalOut));
+  EXPECT_TRUE(sim_.level(LINE_TERMINAL_OUT));
 }
 
 TEST_F(Gpio, AnActionSequenceShowsOnTheLine) {
@@ -151,7 +160,8 @@ TEST_F(Gpio, AnActionSequenceShowsOnTheLine) {
   const LineHistory history;
   EXPECT_EQ(client_.start_sequence(2, {{true, 50}, {false, 50}, {true, 50}, {false, 0}}), "");
   EXPECT_TRUE(wait_until([&] { return client_.sequences_done() == 1; }));
-  EXPECT_EQ(LineHistory::of(sim_.number(kOutput)), (Entries{"set 1", "set 0", "set 1", "set 0"}));
+  EXPECT_EQ(LineHistory::of(sim_.number(LINE_OUTPUT)),
+            (Entries{"set 1", "set 0", "set 1", "set 0"}));
 }
 
 // --- What a lock or a siren on an output would feel ---
@@ -159,23 +169,23 @@ TEST_F(Gpio, AnActionSequenceShowsOnTheLine) {
 TEST_F(Gpio, SettingUpAnOutputDoesNotGlitch) {
   const LineHistory history;
   start(all_ports());
-  EXPECT_EQ(LineHistory::of(sim_.number(kOutput)), (Entries{"set 0", "out"}));
+  EXPECT_EQ(LineHistory::of(sim_.number(LINE_OUTPUT)), (Entries{"set 0", "out"}));
 }
 
 TEST_F(Gpio, SettingUpAnInvertedOutputDoesNotGlitch) {
   const LineHistory history;
   start(all_ports());
-  EXPECT_EQ(LineHistory::of(sim_.number(kInvertedOutput)), (Entries{"set 1", "out"}));
+  EXPECT_EQ(LineHistory::of(sim_.number(LINE_INVERTED_OUTPUT)), (Entries{"set 1", "out"}));
 }
 
 TEST_F(Gpio, SettingUpAnOutputThatTheUserMadeActiveLowDoesNotGlitch) {
   start(all_ports());
   EXPECT_EQ(client_.set_activelow(2, false, true), "");
-  EXPECT_TRUE(sim_.level(kOutput));
+  EXPECT_TRUE(sim_.level(LINE_OUTPUT));
   const LineHistory history;
   restart();
   EXPECT_FALSE(client_.state(2));
-  EXPECT_EQ(LineHistory::of(sim_.number(kOutput)), (Entries{"set 1", "out"}));
+  EXPECT_EQ(LineHistory::of(sim_.number(LINE_OUTPUT)), (Entries{"set 1", "out"}));
 }
 
 TEST_F(Gpio, AKilledDaemonLeavesAnOutputOnAndTheNextTurnsItOffOnce) {
@@ -183,15 +193,15 @@ TEST_F(Gpio, AKilledDaemonLeavesAnOutputOnAndTheNextTurnsItOffOnce) {
   EXPECT_EQ(client_.set_state(2, true), "");
   EXPECT_EQ(client_.set_state(3, true), "");
   daemon_.kill_hard();
-  EXPECT_TRUE(sim_.level(kOutput));
-  EXPECT_FALSE(sim_.level(kInvertedOutput));
+  EXPECT_TRUE(sim_.level(LINE_OUTPUT));
+  EXPECT_FALSE(sim_.level(LINE_INVERTED_OUTPUT));
 
   const LineHistory history;
   daemon_.start();
-  EXPECT_EQ(LineHistory::of(sim_.number(kOutput)), (Entries{"set 0", "out"}));
-  EXPECT_EQ(LineHistory::of(sim_.number(kInvertedOutput)), (Entries{"set 1", "out"}));
+  EXPECT_EQ(LineHistory::of(sim_.number(LINE_OUTPUT)), (Entries{"set 0", "out"}));
+  EXPECT_EQ(LineHistory::of(sim_.number(LINE_INVERTED_OUTPUT)), (Entries{"set 1", "out"}));
   EXPECT_EQ(client_.set_state(2, true), "");
-  EXPECT_TRUE(sim_.level(kOutput));
+  EXPECT_TRUE(sim_.level(LINE_OUTPUT));
 }
 
 TEST_F(Gpio, ARestartTurnsOutputsOff) {
@@ -199,7 +209,7 @@ TEST_F(Gpio, ARestartTurnsOutputsOff) {
   EXPECT_EQ(client_.set_state(2, true), "");
   restart();
   EXPECT_FALSE(client_.state(2));
-  EXPECT_FALSE(sim_.level(kOutput));
+  EXPECT_FALSE(sim_.level(LINE_OUTPUT));
 }
 
 }  // namespace

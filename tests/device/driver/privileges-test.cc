@@ -33,43 +33,50 @@ bool logged_together(const std::string &one, const std::string &other) {
 
 class Privileges : public SupervisedTest {
  protected:
-  enum Number { kIn, kOut, kAdc, kSpi, kIio, kInterrupt };
+  enum Number { PORT_IN, PORT_OUT, PORT_ADC, PORT_SPI, PORT_IIO, PORT_INTERRUPT };
   // Lines of the plain chip.
-  enum PlainLine { kInLine, kOutLine, kIioLine, kIioIoCtrl, kIioSioCtrl, kInterruptLine };
+  enum PlainLine {
+    PLAIN_IN,
+    PLAIN_OUT,
+    PLAIN_IIO,
+    PLAIN_IIO_IO_CTRL,
+    PLAIN_IIO_SIO_CTRL,
+    PLAIN_INTERRUPT
+  };
 
   void SetUp() override { MockIio::set_value(kSampled, kOpen); }
 
   std::string all_backends() const {
-    return port_element("in", kIn, "input", "gpio",
-                        "<input pin='" + plain_.number_text(kInLine) + "'/>", true) +
-           port_element("out", kOut, "output", "gpio",
-                        "<output pin='" + plain_.number_text(kOutLine) + "'/>") +
-           port_element("adc", kAdc, "input", "spiadc",
+    return port_element("in", PORT_IN, "input", "gpio",
+                        "<input pin='" + plain_.number_text(PLAIN_IN) + "'/>", true) +
+           port_element("out", PORT_OUT, "output", "gpio",
+                        "<output pin='" + plain_.number_text(PLAIN_OUT) + "'/>") +
+           port_element("adc", PORT_ADC, "input", "spiadc",
                         "<device device='" + MockSpi::node(0) +
                             "' address='17' timeout='50'/><range n='1'/><input active_min='1000' "
                             "active_max='2000'/>",
                         true) +
-           port_element("spi", kSpi, "input", "spi",
+           port_element("spi", PORT_SPI, "input", "spi",
                         input_pins() + "<device path='" + MockSpi::node(1) +
                             "'/><address value='11'/>" + all_ranges(),
                         true) +
-           port_element("iio", kIio, "input", "iio",
-                        "<input pin='" + plain_.number_text(kIioLine) + "'/><io_ctrl pin='" +
-                            plain_.number_text(kIioIoCtrl) + "'/><sio_ctrl pin='" +
-                            plain_.number_text(kIioSioCtrl) +
+           port_element("iio", PORT_IIO, "input", "iio",
+                        "<input pin='" + plain_.number_text(PLAIN_IIO) + "'/><io_ctrl pin='" +
+                            plain_.number_text(PLAIN_IIO_IO_CTRL) + "'/><sio_ctrl pin='" +
+                            plain_.number_text(PLAIN_IIO_SIO_CTRL) +
                             "'/><device name='mock-adc0' adc='mock-adc0' hrtimer='" +
                             TimerTrigger::kName + "' freq='100' channel='" +
                             std::to_string(kSampled) + "'/>" + all_ranges(),
                         true) +
-           port_element("interrupt", kInterrupt, "input", "iio-interrupt",
-                        "<input pin='" + plain_.number_text(kInterruptLine) +
+           port_element("interrupt", PORT_INTERRUPT, "input", "iio-interrupt",
+                        "<input pin='" + plain_.number_text(PLAIN_INTERRUPT) +
                             "'/><device driver='mock-adc1' channel='" + std::to_string(kWatched) +
                             "' hysteresis='5' cache_ad_value='false'/>" + all_ranges(),
                         true);
   }
 
   void start_all() {
-    plain_.export_low(kIioSioCtrl);
+    plain_.export_low(PLAIN_IIO_SIO_CTRL);
     start(all_backends());
   }
   bool in_service(const std::string &name) {
@@ -92,20 +99,20 @@ class Privileges : public SupervisedTest {
     for (const char *name : {"in", "adc", "spi", "iio", "interrupt"}) {
       EXPECT_TRUE(in_service(name)) << name;
     }
-    plain_.pull(kInLine, true);
-    EXPECT_TRUE(reports(kIn, true));
+    plain_.pull(PLAIN_IN, true);
+    EXPECT_TRUE(reports(PORT_IN, true));
     MockSpi::set_sample(0, kCommand, 1500);
-    EXPECT_TRUE(reports(kAdc, true));
+    EXPECT_TRUE(reports(PORT_ADC, true));
     MockSpi::set_sample(1, kCommand, kOpen);
-    for (const int port : {kSpi, kIio, kInterrupt}) {
+    for (const int port : {PORT_SPI, PORT_IIO, PORT_INTERRUPT}) {
       EXPECT_EQ(client_.set_supervised(port, true), "");
     }
     expect_path(true);
-    EXPECT_TRUE(plain_.level(kIioSioCtrl));
-    EXPECT_TRUE(reads(kSpi, "open", kOpen));
-    EXPECT_TRUE(reads(kIio, state, level));
+    EXPECT_TRUE(plain_.level(PLAIN_IIO_SIO_CTRL));
+    EXPECT_TRUE(reads(PORT_SPI, "open", kOpen));
+    EXPECT_TRUE(reads(PORT_IIO, state, level));
     MockIio::set_value(kWatched, kCut, 1);
-    EXPECT_TRUE(reads(kInterrupt, "cut", kCut));
+    EXPECT_TRUE(reads(PORT_INTERRUPT, "cut", kCut));
   }
   std::string status_line(const std::string &field) const {
     std::istringstream status(
@@ -135,14 +142,14 @@ TEST_F(Privileges, TheDaemonIsTheServiceAccountWithItsGroups) {
 
 TEST_F(Privileges, EveryBackendWorksOnAfterTheDrop) {
   start_all();
-  EXPECT_EQ(client_.set_state(kOut, true), "");
-  EXPECT_TRUE(plain_.level(kOutLine));
+  EXPECT_EQ(client_.set_state(PORT_OUT, true), "");
+  EXPECT_TRUE(plain_.level(PLAIN_OUT));
   expect_inputs_work(kOpen, "open");
 }
 
 TEST_F(Privileges, SettingsAreSavedAndStayTheAccounts) {
   start_all();
-  EXPECT_EQ(client_.set_activelow(kIn, true, true), "");
+  EXPECT_EQ(client_.set_activelow(PORT_IN, true, true), "");
   const std::string file = "/etc/portd/portd.conf";
   EXPECT_TRUE(wait_until([&] {
     return read_text(file).value_or("").find("input_activelow=true") != std::string::npos;
@@ -160,9 +167,9 @@ TEST_F(Privileges, ARefreshWithoutRightsSaysWhatIsMissing) {
   const std::string denied = g_strerror(EACCES);
   const std::string lines = "/sys/class/gpio/";
   for (const std::string &what :
-       {lines + "unexport", lines + "gpio" + plain_.number_text(kInLine) + "/direction",
-        lines + "gpio" + sim_.number_text(kSioCtrl) + "/active_low",
-        lines + "gpio" + plain_.number_text(kIioSioCtrl) + "/active_low", MockSpi::node(0),
+       {lines + "unexport", lines + "gpio" + plain_.number_text(PLAIN_IN) + "/direction",
+        lines + "gpio" + sim_.number_text(LINE_SIO_CTRL) + "/active_low",
+        lines + "gpio" + plain_.number_text(PLAIN_IIO_SIO_CTRL) + "/active_low", MockSpi::node(0),
         MockIio::node(1)}) {
     EXPECT_TRUE(logged_together(what, denied)) << what;
   }
@@ -170,15 +177,15 @@ TEST_F(Privileges, ARefreshWithoutRightsSaysWhatIsMissing) {
     EXPECT_FALSE(in_service(name)) << name;
   }
   // What was not dropped works on.
-  EXPECT_EQ(client_.set_state(kOut, true), "");
-  EXPECT_TRUE(plain_.level(kOutLine));
+  EXPECT_EQ(client_.set_state(PORT_OUT, true), "");
+  EXPECT_TRUE(plain_.level(PLAIN_OUT));
 }
 
 // Its lines alone are not enough for a buffered converter.
 TEST_F(Privileges, ARefreshOfABufferedConverterSaysWhatIsMissing) {
   start_all();
   EXPECT_EQ(client_.drop("iio"), std::vector<std::string>{"iio"});
-  grant_lines(plain_, {kIioLine, kIioIoCtrl, kIioSioCtrl});
+  grant_lines(plain_, {PLAIN_IIO, PLAIN_IIO_IO_CTRL, PLAIN_IIO_SIO_CTRL});
   EXPECT_EQ(client_.refresh(), "");
   const std::string denied = g_strerror(EACCES);
   for (const std::string &what :
@@ -193,8 +200,9 @@ TEST_F(Privileges, WithRightsFromTheDeviceManagerARefreshWorks) {
   start_all();
   drop_all();
   // The account could not give the lines back, so they are there to be used again.
-  grant_lines(plain_, {kInLine, kIioLine, kIioIoCtrl, kIioSioCtrl, kInterruptLine});
-  grant_lines(sim_, {kInput, kIoCtrl, kSioCtrl});
+  grant_lines(plain_,
+              {PLAIN_IN, PLAIN_IIO, PLAIN_IIO_IO_CTRL, PLAIN_IIO_SIO_CTRL, PLAIN_INTERRUPT});
+  grant_lines(sim_, {LINE_INPUT, LINE_IO_CTRL, LINE_SIO_CTRL});
   grant_tree(TimerTrigger::folder());
   for (const int device : {0, 1}) {
     grant(MockSpi::node(device));

@@ -18,60 +18,61 @@ constexpr std::size_t kPorts = 7;
 
 class Soak : public SupervisedTest {
  protected:
-  enum Number { kIn, kOut, kTerminal, kSpi, kInterrupt, kAdc, kIio };
+  enum Number { PORT_IN, PORT_OUT, PORT_TERMINAL, PORT_SPI, PORT_INTERRUPT, PORT_ADC, PORT_IIO };
   // Lines of the plain chip.
   enum PlainLine {
-    kInLine,
-    kOutLine,
-    kTerminalIn,
-    kTerminalOut,
-    kTerminalCtrl,
-    kInterruptLine,
-    kIioLine,
-    kIioIoCtrl,
-    kIioSioCtrl
+    PLAIN_IN,
+    PLAIN_OUT,
+    PLAIN_TERMINAL_IN,
+    PLAIN_TERMINAL_OUT,
+    PLAIN_TERMINAL_CTRL,
+    PLAIN_INTERRUPT,
+    PLAIN_IIO,
+    PLAIN_IIO_IO_CTRL,
+    PLAIN_IIO_SIO_CTRL
   };
 
   void SetUp() override {
     MockSpi::set_sample(0, kCommand, kOpen);
     MockSpi::set_sample(1, kCommand, kOpen);
     MockIio::set_value(kSampled, kOpen, 1);
-    plain_.export_low(kIioSioCtrl);
+    plain_.export_low(PLAIN_IIO_SIO_CTRL);
     start(gpio_ports() + spi_ports() + iio_ports());
     // For what is dropped and comes back.
-    grant_tree("/sys/class/gpio/gpio" + plain_.number_text(kInLine));
+    grant_tree("/sys/class/gpio/gpio" + plain_.number_text(PLAIN_IN));
     grant(MockSpi::node(1));
   }
   std::string pin(const std::string &section, int line) const {
     return "<" + section + " pin='" + plain_.number_text(line) + "'/>";
   }
   std::string gpio_ports() const {
-    return port_element("in", kIn, "input", "gpio", pin("input", kInLine), true) +
-           port_element("out", kOut, "output", "gpio", pin("output", kOutLine)) +
-           port_element("terminal", kTerminal, "io_ctrl", "gpio",
-                        pin("input", kTerminalIn) + pin("output", kTerminalOut) +
-                            pin("io_ctrl", kTerminalCtrl));
+    return port_element("in", PORT_IN, "input", "gpio", pin("input", PLAIN_IN), true) +
+           port_element("out", PORT_OUT, "output", "gpio", pin("output", PLAIN_OUT)) +
+           port_element("terminal", PORT_TERMINAL, "io_ctrl", "gpio",
+                        pin("input", PLAIN_TERMINAL_IN) + pin("output", PLAIN_TERMINAL_OUT) +
+                            pin("io_ctrl", PLAIN_TERMINAL_CTRL));
   }
   std::string spi_ports() const {
-    return port_element("spi", kSpi, "input", "spi",
+    return port_element("spi", PORT_SPI, "input", "spi",
                         input_pins() + "<device path='" + MockSpi::node(0) +
                             "'/><address value='11'/>" + all_ranges()) +
-           port_element("adc", kAdc, "input", "spiadc",
+           port_element("adc", PORT_ADC, "input", "spiadc",
                         "<device device='" + MockSpi::node(1) +
                             "' address='17' timeout='50'/><range n='1'/><input active_min='1000' "
                             "active_max='1500'/>",
                         true);
   }
   std::string iio_ports() const {
-    return port_element("interrupt", kInterrupt, "input", "iio-interrupt",
-                        pin("input", kInterruptLine) + "<device driver='mock-adc0' channel='" +
+    return port_element("interrupt", PORT_INTERRUPT, "input", "iio-interrupt",
+                        pin("input", PLAIN_INTERRUPT) + "<device driver='mock-adc0' channel='" +
                             std::to_string(kWatched) + "' cache_ad_value='false'/>" +
                             all_ranges()) +
-           port_element(
-               "iio", kIio, "input", "iio",
-               pin("input", kIioLine) + pin("io_ctrl", kIioIoCtrl) + pin("sio_ctrl", kIioSioCtrl) +
-                   "<device name='mock-adc1' adc='mock-adc1' hrtimer='" + TimerTrigger::kName +
-                   "' freq='50' channel='" + std::to_string(kSampled) + "'/>" + all_ranges());
+           port_element("iio", PORT_IIO, "input", "iio",
+                        pin("input", PLAIN_IIO) + pin("io_ctrl", PLAIN_IIO_IO_CTRL) +
+                            pin("sio_ctrl", PLAIN_IIO_SIO_CTRL) +
+                            "<device name='mock-adc1' adc='mock-adc1' hrtimer='" +
+                            TimerTrigger::kName + "' freq='50' channel='" +
+                            std::to_string(kSampled) + "'/>" + all_ranges());
   }
 
   // Drops the port and takes it in again, which makes its record and its watch anew.
@@ -95,70 +96,70 @@ class Soak : public SupervisedTest {
   void plain_request(int kind, bool odd) {
     switch (kind) {
       case 0:
-        plain_.pull(kInLine, odd);
+        plain_.pull(PLAIN_IN, odd);
         break;
       case 1:
-        EXPECT_EQ(client_.set_state(kOut, odd), "");
+        EXPECT_EQ(client_.set_state(PORT_OUT, odd), "");
         break;
       case 2:
-        EXPECT_EQ(client_.state(kOut), odd);
+        EXPECT_EQ(client_.state(PORT_OUT), odd);
         break;
       case 3:
-        EXPECT_EQ(client_.set_direction(kTerminal, odd ? "output" : "input"), "");
+        EXPECT_EQ(client_.set_direction(PORT_TERMINAL, odd ? "output" : "input"), "");
         break;
       case 4:
-        EXPECT_EQ(client_.set_state(kTerminal, true).empty(), odd);
+        EXPECT_EQ(client_.set_state(PORT_TERMINAL, true).empty(), odd);
         break;
       case 5:
         MockSpi::set_sample(1, kCommand, odd ? kClosed : kOpen);
         break;
       case 6:
-        (void)client_.state(kAdc);
+        (void)client_.state(PORT_ADC);
         break;
       default:
-        (void)client_.start_sequence(kOut, {{!odd, 1}, {odd, 0}});
+        (void)client_.start_sequence(PORT_OUT, {{!odd, 1}, {odd, 0}});
     }
   }
   void supervised_request(int kind, bool odd) {
     switch (kind) {
       case 8:
-        EXPECT_EQ(client_.set_supervised(kSpi, odd), "");
+        EXPECT_EQ(client_.set_supervised(PORT_SPI, odd), "");
         break;
       case 9:
-        EXPECT_EQ(client_.readout(kSpi).level, kOpen);
+        EXPECT_EQ(client_.readout(PORT_SPI).level, kOpen);
         break;
       case 10:
-        EXPECT_EQ(client_.set_supervised(kInterrupt, odd), "");
+        EXPECT_EQ(client_.set_supervised(PORT_INTERRUPT, odd), "");
         break;
       case 11:
         MockIio::set_value(kWatched, static_cast<int>(odd ? kClosed : kCut));
         break;
       case 12:
-        EXPECT_EQ(client_.readout(kInterrupt).state, odd ? "closed" : "cut");
+        EXPECT_EQ(client_.readout(PORT_INTERRUPT).state, odd ? "closed" : "cut");
         break;
       case 13:
-        EXPECT_EQ(client_.set_supervised(kIio, odd), "");
+        EXPECT_EQ(client_.set_supervised(PORT_IIO, odd), "");
         break;
       case 14:
         MockIio::set_value(kSampled, static_cast<int>(odd ? kClosed : kOpen), 1);
         break;
       case 15:
-        EXPECT_TRUE(!odd || reads(kIio, "closed", kClosed));
+        EXPECT_TRUE(!odd || reads(PORT_IIO, "closed", kClosed));
         break;
       default:
-        EXPECT_EQ(client_.set_range(kSpi, "cut", 3000, odd ? 4000 : 4095), "");
+        EXPECT_EQ(client_.set_range(PORT_SPI, "cut", 3000, odd ? 4000 : 4095), "");
     }
   }
   void other_request(int kind, bool odd) {
     switch (kind) {
       case 17:
-        EXPECT_NE(client_.set_range(kSpi, "cut", 10, 5), "");
+        EXPECT_NE(client_.set_range(PORT_SPI, "cut", 10, 5), "");
         break;
       case 18:
         EXPECT_NE(client_.set_state(kNoPort, true), "");
         break;
       case 19:
-        EXPECT_EQ(client_.set_activelow(kIn, true, odd), "");
+        EXPECT_EQ(client_.set_activelow(PORT_IN, true, odd), "");
         break;
       case 20:
         drop_and_refresh("adc");
@@ -170,7 +171,7 @@ class Soak : public SupervisedTest {
         EXPECT_EQ(client_.ports().size(), kPorts);
         break;
       default:
-        EXPECT_EQ(client_.state(kIn), (plain_.level(kInLine)) != odd);
+        EXPECT_EQ(client_.state(PORT_IN), (plain_.level(PLAIN_IN)) != odd);
     }
   }
   void run(int requests) {

@@ -221,7 +221,7 @@ TEST_F(SupervisedIio, SamplesThatNobodyWantsCostNothing) {
   supervise("1000");
   EXPECT_EQ(client_.set_supervised(0, false), "");
   EXPECT_LE(daemon_.load_percent(kIdleTime), kIdlePercent);
-  sim_.pull(kInput, true);
+  sim_.pull(LINE_INPUT, true);
   EXPECT_TRUE(reports(0, true));
 }
 

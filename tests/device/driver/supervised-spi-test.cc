@@ -73,15 +73,15 @@ TEST_F(SupervisedSpi, SupervisionSwitchesThePaths) {
   EXPECT_EQ(client_.set_supervised(0, false), "");
   expect_path(false);
   client_.forget_changes();
-  sim_.pull(kInput, true);
+  sim_.pull(LINE_INPUT, true);
   EXPECT_TRUE(reports(0, true));
 }
 
 // Whichever way: for a moment neither path is on, and on the way back both are.
 TEST_F(SupervisedSpi, ThePlainPathIsSwitchedBeforeTheMeasuredOne) {
   start_input();
-  const std::map<int, std::string> paths{{sim_.number(kIoCtrl), "plain"},
-                                         {sim_.number(kSioCtrl), "measured"}};
+  const std::map<int, std::string> paths{{sim_.number(LINE_IO_CTRL), "plain"},
+                                         {sim_.number(LINE_SIO_CTRL), "measured"}};
   const LineHistory history;
   EXPECT_EQ(client_.set_supervised(0, true), "");
   EXPECT_EQ(LineHistory::together(paths),
@@ -98,9 +98,9 @@ TEST_F(SupervisedSpi, AConfigurablePortLeavesBothPathsAsAnOutput) {
   EXPECT_EQ(client_.set_direction(0, "output"), "");
   expect_no_path();
   EXPECT_EQ(client_.set_state(0, true), "");
-  EXPECT_TRUE(sim_.level(kOutput));
+  EXPECT_TRUE(sim_.level(LINE_OUTPUT));
   EXPECT_EQ(client_.set_supervised(0, true), "");
-  EXPECT_FALSE(sim_.level(kOutput));
+  EXPECT_FALSE(sim_.level(LINE_OUTPUT));
   expect_path(true);
   EXPECT_TRUE(reads(0, "open", kOpen));
 }

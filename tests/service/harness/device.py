@@ -360,7 +360,7 @@ class Device:
         return Signals(self.bus.connection, interface, member, path, convert)
 
     def port_props(self) -> list[PortProps]:
-        """GetPortProps; the flags of each port as a dictionary, since their order means nothing."""
+        """GetPortProps; the flags of each port as a dictionary, whose order is not defined."""
         number, entries = self.call("GetPortProps")
         assert number == len(entries)
         return [PortProps(*entry[:6], flags=dict(entry[6])) for entry in entries]

@@ -273,7 +273,7 @@ IOPortRef BackendContract::watched() const {
 }
 
 // Returns when the box has answered everything, and the main loop has taken it.
-void BackendContract::settle_box() {
+void BackendContract::wait_until_box_idle() {
   const auto port = make_port(BACKEND_IOBOX, PORT_OUTPUT, {});
   io_port_set_number(port.get(), kSilentBoxPort);
   static_cast<IoBoxBackendData *>(io_port_backend_data(port.get()))->connected = true;
@@ -285,7 +285,7 @@ void BackendContract::settle_box() {
 
 Held BackendContract::held() const {
   if (GetParam().kind == BACKEND_IOBOX) {
-    settle_box();
+    wait_until_box_idle();
   }
   return {.sources = sources(),
           .watched = watched_files(),

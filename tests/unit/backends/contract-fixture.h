@@ -98,7 +98,7 @@ class BackendContract : public World, public testing::WithParamInterface<Backend
   // Everything is there again that vanished.
   void appear();
 
-  static void settle_box();
+  static void wait_until_box_idle();
   Held held() const;
   // Nothing is held but what was before the first port.
   void expect_given_back() const;

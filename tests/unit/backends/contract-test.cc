@@ -40,7 +40,7 @@ TEST_P(BackendContract, IsKnownByItsWordAndKind) {
   EXPECT_EQ(io_port_backend_kind(GetParam().word), GetParam().kind);
   const auto port = described();
   EXPECT_TRUE(io_port_has_backend(port.get()));
-  EXPECT_EQ(io_port_get_backend(port.get()), GetParam().kind);
+  EXPECT_EQ(port->backend, GetParam().kind);
 }
 
 TEST_P(BackendContract, OffersSupervisionOnlyWhereItHasIt) {

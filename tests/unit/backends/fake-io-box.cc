@@ -10,7 +10,7 @@
 
 namespace {
 
-constexpr std::int64_t kPatienceUs = 20'000'000;
+constexpr std::int64_t kTimeoutUs = 20'000'000;
 
 // Never destroyed: the backend's own proxies go later.
 std::vector<GDBusProxy *> &proxies() {
@@ -79,7 +79,7 @@ std::vector<std::string> io_box_calls() {
 }
 
 bool io_box_hangs() {
-  const std::int64_t deadline = g_get_monotonic_time() + kPatienceUs;
+  const std::int64_t deadline = g_get_monotonic_time() + kTimeoutUs;
   std::unique_lock guard(lock);
   while (hanging == 0 && g_get_monotonic_time() < deadline) {
     changed.wait_until(guard, deadline);

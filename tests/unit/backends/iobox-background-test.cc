@@ -39,10 +39,10 @@ class IoBoxInBackground : public PortFixture {
     io_box_calls();
     return port;
   }
-  static bool settle(const IOPortRef &port) {
-    bool settled = false;
-    io_port_when_settled(port.get(), [&] { settled = true; });
-    return iterate_until([&] { return settled; });
+  static bool wait_until_idle(const IOPortRef &port) {
+    bool idle = false;
+    io_port_when_idle(port.get(), [&] { idle = true; });
+    return iterate_until([&] { return idle; });
   }
 };
 
@@ -54,7 +54,7 @@ TEST_F(IoBoxInBackground, IsInServiceWhenTheBoxHasAnsweredAndNotBefore) {
   EXPECT_FALSE(io_port_is_set_up(port.get()));
   EXPECT_FALSE(io_port_events_enabled(port.get()));
   io_box_recovers();
-  ASSERT_TRUE(settle(port));
+  ASSERT_TRUE(wait_until_idle(port));
   EXPECT_TRUE(io_port_is_set_up(port.get()));
   EXPECT_TRUE(io_port_events_enabled(port.get()));
   EXPECT_EQ(io_box_calls(),
@@ -76,7 +76,7 @@ TEST_F(IoBoxInBackground, TakesASignalForNewerThanTheAnswerThatItOvertakes) {
   ASSERT_TRUE(io_box_hangs());
   io_box_signals(1, "closed");
   io_box_recovers();
-  ASSERT_TRUE(settle(port));
+  ASSERT_TRUE(wait_until_idle(port));
   EXPECT_TRUE(io_port_get_state(port.get()));
 }
 
@@ -89,7 +89,7 @@ TEST_F(IoBoxInBackground, HasTheStateThatWasAskedForWhileTheBoxHangs) {
   EXPECT_TRUE(io_port_set_state(port.get(), false));
   EXPECT_FALSE(io_port_get_state(port.get()));
   io_box_recovers();
-  ASSERT_TRUE(settle(port));
+  ASSERT_TRUE(wait_until_idle(port));
   EXPECT_EQ(io_box_calls(), (Calls{"SetIOMode (1, 1, 'out')", "SetIOMode (1, 0, 'out')"}));
 }
 
@@ -99,7 +99,7 @@ TEST_F(IoBoxInBackground, HasTheLevelThatTheBoxIsToldWhenAnInputBecomesAnOutput)
   EXPECT_TRUE(io_port_get_state(port.get()));
   EXPECT_TRUE(io_port_set_direction(port.get(), false));
   EXPECT_FALSE(io_port_get_state(port.get()));
-  ASSERT_TRUE(settle(port));
+  ASSERT_TRUE(wait_until_idle(port));
   EXPECT_EQ(io_box_calls(), Calls{"SetIOMode (1, 0, 'out')"});
 }
 
@@ -112,24 +112,24 @@ TEST_F(IoBoxInBackground, TellsEventsForSupervisedInputsTheLine) {
   io_box_signals(1, "short");
   EXPECT_EQ(listener.heard(), (Lines{"send line 3", "send plain 0", "changed 1 off", "send line 2",
                                      "send plain 0", "changed 1 off"}));
-  ASSERT_TRUE(settle(port));
+  ASSERT_TRUE(wait_until_idle(port));
 }
 
 TEST_F(IoBoxInBackground, TellsABoxThatIsStartedAnewItsModesAndReportsWhatHasChanged) {
   const auto output = in_service(on_box().number(2).output());
   EXPECT_TRUE(io_port_set_state(output.get(), true));
   const auto input = in_service(on_box().number(1).input());
-  ASSERT_TRUE(settle(output));
+  ASSERT_TRUE(wait_until_idle(output));
   io_box_calls();
   listener.heard();
   fake_io_box().state = "closed";
   io_box_restarts();
-  ASSERT_TRUE(settle(input));
+  ASSERT_TRUE(wait_until_idle(input));
   EXPECT_EQ(io_box_calls(),
             (Calls{"SetIOMode (2, 1, 'out')", "SetIOMode (1, 0, 'in')", "GetIOState (1,)"}));
   EXPECT_EQ(listener.heard(), Lines{"changed 1 on"});
   io_box_restarts();
-  ASSERT_TRUE(settle(input));
+  ASSERT_TRUE(wait_until_idle(input));
   EXPECT_EQ(listener.heard(), Lines{});
 }
 
@@ -142,7 +142,7 @@ TEST_F(IoBoxInBackground, IsDroppedWhileTheBoxHangsAndNoLongerListens) {
   io_box_signals(1, "closed");
   io_box_restarts();
   io_box_recovers();
-  ASSERT_TRUE(settle(port));
+  ASSERT_TRUE(wait_until_idle(port));
   EXPECT_FALSE(io_port_get_state(port.get()));
   EXPECT_EQ(io_box_calls(), Calls{"SetIOMode (1, 1, 'out')"});
 }

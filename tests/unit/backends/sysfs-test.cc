@@ -384,8 +384,8 @@ TEST_F(Sysfs, PollsAtTheIntervalOfItsDescriptionInTheBaseThatItHas) {
 TEST_F(Sysfs, PollsAtASensibleIntervalWhereItsDescriptionHasNone) {
   for (const char *timeout : {"soon", "", "0"}) {
     expect_interval(timeout, 10);
-    EXPECT_TRUE(log.took_warning(
-        "Port port: no usable polling interval is given; it is polled every 10 ms"));
+    EXPECT_TRUE(
+        log.took_warning("Port port: no valid polling interval is given: polling every 10 ms"));
   }
 }
 

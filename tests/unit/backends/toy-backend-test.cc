@@ -4,6 +4,7 @@
 #include <sstream>
 
 #include "hwdesc/hwdesc.h"
+#include "port/ioport-private.h"
 #include "support/port-fixture.h"
 #include "support/temp-dir.h"
 
@@ -36,7 +37,7 @@ class ToyBackend : public PortFixture {
 
 TEST_F(ToyBackend, IsKnownToTheLoaderByItsWord) {
   const auto port = load("/dev/null");
-  EXPECT_EQ(io_port_get_backend(port.get()), kToyKind);
+  EXPECT_EQ(port->backend, kToyKind);
   EXPECT_TRUE(io_port_has_backend(port.get()));
 }
 

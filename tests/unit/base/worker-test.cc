@@ -17,7 +17,7 @@ void hang(GCancellable *cancellable) {
   if (!g_cancellable_make_pollfd(cancellable, &poll)) {
     return;
   }
-  g_poll(&poll, 1, static_cast<gint>(kTestPatienceUs / 1000));
+  g_poll(&poll, 1, static_cast<gint>(kTestTimeoutUs / 1000));
   g_cancellable_release_fd(cancellable);
 }
 
@@ -57,7 +57,7 @@ TEST(Worker, CancelsWhatHangsAndWhatWaitsBehindItWhenStopped) {
   }
   const std::int64_t begun = g_get_monotonic_time();
   worker.stop();
-  EXPECT_LT(g_get_monotonic_time() - begun, kTestPatienceUs / 2);
+  EXPECT_LT(g_get_monotonic_time() - begun, kTestTimeoutUs / 2);
   EXPECT_EQ(cancelled, (std::vector<gboolean>{TRUE, TRUE}));
 }
 

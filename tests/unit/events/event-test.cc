@@ -346,7 +346,7 @@ class EventValues : public Events {
   std::string value_of(const IOPortRef &port, const char *word, const char *type) {
     IoEvent event = named("type");
     event.keys.push_front(key("k", word, type));
-    EXPECT_TRUE(event_keys_are_sound(port.get(), event.keys));
+    EXPECT_TRUE(event_keys_are_valid(port.get(), event.keys));
     const auto declaration = event_declaration_new();
     std::string property;
     EXPECT_TRUE(populate_event_values(

@@ -12,7 +12,7 @@ TEST_F(GpioBackendTest, TheWatchIsForErrorsAlone) {
   EXPECT_EQ(seams().fd_conditions, std::vector<GIOCondition>{G_IO_ERR});
 }
 
-TEST_F(GpioBackendTest, AnEdgeIsReportedAfterTheLineHadTimeToSettle) {
+TEST_F(GpioBackendTest, AnEdgeIsReportedAfterTheLineWasDebounced) {
   make_watched_input();
   line("1").edge(1);
   EXPECT_EQ(serve(), 1);

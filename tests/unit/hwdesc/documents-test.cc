@@ -150,7 +150,7 @@ TEST_F(Documents, WarnOfElementsBeforeAnyPort) {
            "<event declaration='e'/><keyvalue key='k'/><port name='a'/></ports>"));
   for (const char *element : {"port_type", "properties", "port_no", "param_default_name", "backend",
                               "event", "keyvalue"}) {
-    EXPECT_TRUE(log.took_warning("Element " + std::string(element) + " stands before any port"));
+    EXPECT_TRUE(log.took_warning("Element " + std::string(element) + " comes before any port"));
   }
   EXPECT_EQ(ids(), Lines{"a"});
   EXPECT_TRUE(io_port_events(port("a").get()).empty());

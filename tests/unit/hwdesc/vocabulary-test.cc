@@ -1,5 +1,6 @@
 // What each word of the hardware description does.
 #include "hwdesc/hwdesc-fixture.h"
+#include "port/ioport-private.h"
 
 namespace {
 
@@ -132,16 +133,16 @@ TEST_F(Vocabulary, ChoosesTheBackend) {
       {"iio-interrupt", 5}, {"sysfs", 6}, {"iobox", 7},  {"null", 8}, {"check", 9}};
   for (const auto &[word, kind] : words) {
     ASSERT_TRUE(load_port("<backend name='" + std::string(word) + "'/>"));
-    EXPECT_EQ(io_port_get_backend(port().get()), kind) << word;
+    EXPECT_EQ(port()->backend, kind) << word;
   }
 }
 
 TEST_F(Vocabulary, LeavesAPortWithoutABackendThatItDoesNotKnow) {
   ASSERT_TRUE(load_port("<backend name='GPIO'><input pin='3'/></backend>"));
   EXPECT_FALSE(io_port_has_backend(port().get()));
-  EXPECT_EQ(io_port_get_backend(port().get()), 0);
+  EXPECT_EQ(port()->backend, 0);
   EXPECT_TRUE(log.took_warning("Port p: no backend is called GPIO"));
-  EXPECT_TRUE(log.took_warning("Port p has no backend to set input pin of"));
+  EXPECT_TRUE(log.took_warning("Port p has no backend: input pin is ignored"));
 }
 
 TEST_F(Vocabulary, HandsTheElementsInsideToTheBackend) {
@@ -177,7 +178,7 @@ TEST_F(Vocabulary, LetsASecondBackendReplaceTheFirst) {
   EXPECT_TRUE(properties_of("<backend name='sysfs'><device path='/dev/null'/></backend>"
                             "<backend name='check'/>")
                   .empty());
-  EXPECT_EQ(io_port_get_backend(port().get()), BACKEND_CHECK);
+  EXPECT_EQ(port()->backend, BACKEND_CHECK);
 }
 
 // --- event and keyvalue ---
@@ -245,7 +246,7 @@ TEST_F(Vocabulary, LeavesThePropertyOfAKeyAsItIsForOtherWords) {
 
 TEST_F(Vocabulary, WarnsOfAKeyBeforeAnyEvent) {
   ASSERT_TRUE(load_port("<keyvalue key='a' value='1'/><port_no nbr='2'/>"));
-  EXPECT_TRUE(log.took_warning("Port p: a key stands before any event"));
+  EXPECT_TRUE(log.took_warning("Port p: a keyvalue element comes before any event"));
   EXPECT_EQ(io_port_get_number(port().get()), 2);
 }
 

@@ -273,10 +273,10 @@ TEST_F(ImportTest, lines_may_end_as_elsewhere) {
 TEST_F(ImportTest, file_that_is_no_regular_one) {
   ASSERT_EQ(mkfifo(path_of("pipe").c_str(), 0600), 0);
   EXPECT_EQ(param_read_parhand(path_of("pipe").c_str()), std::nullopt);
-  EXPECT_TRUE(log().took_warning("Left " + path_of("pipe") + " alone: Not a regular file"));
+  EXPECT_TRUE(log().took_warning("Ignored " + path_of("pipe") + ": Not a regular file"));
   ASSERT_EQ(symlink("export.conf", path_of("link").c_str()), 0);
   EXPECT_EQ(param_read_parhand(path_of("link").c_str()), std::nullopt);
-  EXPECT_TRUE(log().took_warning("Left " + path_of("link") + " alone: Is a link"));
+  EXPECT_TRUE(log().took_warning("Ignored " + path_of("link") + ": Is a link"));
 }
 
 TEST_F(ImportTest, file_of_the_largest_size) {
@@ -284,7 +284,7 @@ TEST_F(ImportTest, file_of_the_largest_size) {
   EXPECT_EQ(param_read_parhand(write_file("large", std::string(most, 'x')).c_str())->size(), most);
   const std::string larger = write_file("larger", std::string(most + 1, 'x'));
   EXPECT_EQ(param_read_parhand(larger.c_str()), std::nullopt);
-  EXPECT_TRUE(log().took_warning("Left " + larger + " alone: File too large"));
+  EXPECT_TRUE(log().took_warning("Ignored " + larger + ": File too large"));
 }
 
 }  // namespace

@@ -97,9 +97,10 @@ TEST_F(ObjectsTest, unregistering_twice_is_told) {
 }
 
 TEST_F(ObjectsTest, object_that_is_there_already) {
-  ASSERT_TRUE(iocontrol_conf_legacy_dbus_register_object(controller_, 3, LEGACY_INTERFACE_OUTPUT));
+  ASSERT_TRUE(iocontrol_conf_legacy_dbus_register_object(controller_, 3, LegacyInterface::kOutput));
   testing::internal::CaptureStderr();
-  EXPECT_FALSE(iocontrol_conf_legacy_dbus_register_object(controller_, 3, LEGACY_INTERFACE_OUTPUT));
+  EXPECT_FALSE(
+      iocontrol_conf_legacy_dbus_register_object(controller_, 3, LegacyInterface::kOutput));
   const std::string said = testing::internal::GetCapturedStderr();
   EXPECT_TRUE(said.starts_with("iocontrol_conf_legacy_dbus_register_object@487: Error: \""))
       << said;
@@ -110,7 +111,7 @@ TEST_F(ObjectsTest, object_that_is_there_already) {
 TEST_F(ObjectsTest, method_call_gets_an_error_and_does_not_wait) {
   controller_.introspection = legacy_introspection_parse(
       "<node><interface name='com.kelv.Odd'><method name='Act'/></interface></node>");
-  ASSERT_TRUE(iocontrol_conf_legacy_dbus_register_object(controller_, 0, LEGACY_INTERFACE_PORT));
+  ASSERT_TRUE(iocontrol_conf_legacy_dbus_register_object(controller_, 0, LegacyInterface::kPort));
   constexpr int limit_ms = 10'000;
   Answer answer;
   g_dbus_connection_call(wire_.client(), nullptr, legacy_object_path(0).c_str(), "com.kelv.Odd",
@@ -128,7 +129,7 @@ using ObjectsDeathTest = ObjectsTest;
 
 TEST_F(ObjectsDeathTest, registration_that_fails) {
   add_port(0, PORT_INPUT);
-  ASSERT_TRUE(iocontrol_conf_legacy_dbus_register_object(controller_, 0, LEGACY_INTERFACE_INPUT));
+  ASSERT_TRUE(iocontrol_conf_legacy_dbus_register_object(controller_, 0, LegacyInterface::kInput));
   EXPECT_DEATH(legacy_register_objects(controller_), "Unable to register objects on DBus");
   unreg_port_objects(controller_);
 }

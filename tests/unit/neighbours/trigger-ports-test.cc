@@ -9,7 +9,7 @@
 #include <vector>
 
 #include "daemon/backends.h"
-#include "port/ioport.h"
+#include "port/ioport-private.h"
 #include "port/port-listener.h"
 #include "port/port-registry.h"
 
@@ -40,7 +40,7 @@ class TriggerPorts : public testing::Test {
     port_listener().declare_event = declare;
     port_listener().undeclare_event = undeclare;
     manual_trigger_configure(kFirst);
-    manual_trigger_expect_ptz(PTZ_UNKNOWN);
+    manual_trigger_store_ptz(PtzState::kUnknown);
   }
   void TearDown() override {
     manual_trigger_clear();
@@ -75,7 +75,7 @@ TEST_F(TriggerPorts, MakesAVirtualOutputWithOneEvent) {
   ASSERT_TRUE(port);
   EXPECT_EQ(io_port_get_number(port.get()), kFirst + 1);
   EXPECT_EQ(io_port_get_type(port.get()), PORT_OUTPUT);
-  EXPECT_EQ(io_port_get_backend(port.get()), 0);
+  EXPECT_EQ(port->backend, 0);
   EXPECT_TRUE(io_port_is_set_up(port.get()));
   EXPECT_EQ(io_port_get_flags(port.get()),
             (std::vector<std::pair<std::string, bool>>{{"virtual", true}}));
@@ -118,23 +118,29 @@ struct Decision {
 };
 
 std::string describe(const Decision &decision) {
-  return "ptz " + std::to_string(decision.ptz) + " channel " + std::to_string(decision.channel) +
-         (decision.enabled ? " enabled" : " disabled");
+  return "ptz " + std::to_string(static_cast<int>(decision.ptz)) + " channel " +
+         std::to_string(decision.channel) + (decision.enabled ? " enabled" : " disabled");
 }
 
 constexpr Decision kDecisions[] = {
-    {PTZ_DISABLED, 1, true, true, true, false},  {PTZ_DISABLED, 1, false, true, true, false},
-    {PTZ_DISABLED, 2, true, false, true, false}, {PTZ_DISABLED, 2, false, false, true, false},
-    {PTZ_ENABLED, 1, true, true, true, true},    {PTZ_ENABLED, 1, false, false, false, false},
-    {PTZ_ENABLED, 2, true, true, true, true},    {PTZ_ENABLED, 2, false, false, false, false},
-    {PTZ_UNKNOWN, 1, true, true, true, true},    {PTZ_UNKNOWN, 1, false, false, false, false},
-    {PTZ_UNKNOWN, 2, true, true, true, true},    {PTZ_UNKNOWN, 2, false, false, false, false},
+    {PtzState::kDisabled, 1, true, true, true, false},
+    {PtzState::kDisabled, 1, false, true, true, false},
+    {PtzState::kDisabled, 2, true, false, true, false},
+    {PtzState::kDisabled, 2, false, false, true, false},
+    {PtzState::kEnabled, 1, true, true, true, true},
+    {PtzState::kEnabled, 1, false, false, false, false},
+    {PtzState::kEnabled, 2, true, true, true, true},
+    {PtzState::kEnabled, 2, false, false, false, false},
+    {PtzState::kUnknown, 1, true, true, true, true},
+    {PtzState::kUnknown, 1, false, false, false, false},
+    {PtzState::kUnknown, 2, true, true, true, true},
+    {PtzState::kUnknown, 2, false, false, false, false},
 };
 
 TEST_F(TriggerPorts, DecidesForAChannelThatIsNew) {
   for (const auto &decision : kDecisions) {
     SCOPED_TRACE(describe(decision));
-    manual_trigger_expect_ptz(decision.ptz);
+    manual_trigger_store_ptz(decision.ptz);
     manual_trigger_set_channel(decision.channel, decision.enabled);
     EXPECT_TRUE(exists(decision.channel));
     EXPECT_EQ(declared(decision.channel), decision.declared_when_new);
@@ -146,9 +152,9 @@ TEST_F(TriggerPorts, DecidesForAChannelThatHasItsPort) {
   for (const bool was_declared : {true, false}) {
     for (const auto &decision : kDecisions) {
       SCOPED_TRACE(describe(decision) + (was_declared ? ", declared" : ", not declared"));
-      manual_trigger_expect_ptz(PTZ_UNKNOWN);
+      manual_trigger_store_ptz(PtzState::kUnknown);
       manual_trigger_set_channel(decision.channel, was_declared);
-      manual_trigger_expect_ptz(decision.ptz);
+      manual_trigger_store_ptz(decision.ptz);
       manual_trigger_set_channel(decision.channel, decision.enabled);
       EXPECT_EQ(declared(decision.channel),
                 was_declared ? decision.declared_when_it_was : decision.declared_when_it_was_not);
@@ -167,33 +173,33 @@ TEST_F(TriggerPorts, MakesOnePortForAChannelHoweverOftenItIsEnabled) {
 }
 
 TEST_F(TriggerPorts, GivesTheFirstChannelATriggerWhenThereIsNoOther) {
-  manual_trigger_set_ptz(PTZ_ENABLED);
+  manual_trigger_set_ptz(PtzState::kEnabled);
   EXPECT_EQ(declared_channels(), Channels({1}));
   EXPECT_EQ(port_registry_count(), 1U);
 }
 
 TEST_F(TriggerPorts, DeclaresAllEnabledChannelsWhenCameraControlIsSwitchedOn) {
-  manual_trigger_set_ptz(PTZ_DISABLED);
+  manual_trigger_set_ptz(PtzState::kDisabled);
   for (const int channel : {1, 2, 3}) {
     manual_trigger_set_channel(channel, true);
   }
   EXPECT_EQ(declared_channels(), Channels({1}));
-  manual_trigger_set_ptz(PTZ_ENABLED);
+  manual_trigger_set_ptz(PtzState::kEnabled);
   EXPECT_EQ(declared_channels(), Channels({1, 2, 3}));
 }
 
 TEST_F(TriggerPorts, KeepsWhatIsDeclaredWhenCameraControlIsSwitchedOff) {
-  manual_trigger_set_ptz(PTZ_ENABLED);
+  manual_trigger_set_ptz(PtzState::kEnabled);
   manual_trigger_set_channel(2, true);
-  manual_trigger_set_ptz(PTZ_DISABLED);
+  manual_trigger_set_ptz(PtzState::kDisabled);
   EXPECT_EQ(declared_channels(), Channels({1, 2}));
 }
 
 TEST_F(TriggerPorts, LeavesDisabledChannelsOutWhenCameraControlIsSwitchedOn) {
-  manual_trigger_set_ptz(PTZ_DISABLED);
+  manual_trigger_set_ptz(PtzState::kDisabled);
   manual_trigger_set_channel(2, true);
   manual_trigger_set_channel(3, false);
-  manual_trigger_set_ptz(PTZ_ENABLED);
+  manual_trigger_set_ptz(PtzState::kEnabled);
   EXPECT_EQ(declared_channels(), Channels({1, 2}));
 }
 
@@ -202,7 +208,7 @@ TEST_F(TriggerPorts, ForgetsAChannelThatIsGone) {
   manual_trigger_set_channel(2, true);
   manual_trigger_remove_channel(2);
   EXPECT_FALSE(exists(2));
-  manual_trigger_set_ptz(PTZ_ENABLED);
+  manual_trigger_set_ptz(PtzState::kEnabled);
   EXPECT_FALSE(exists(2));
   EXPECT_EQ(declared_channels(), Channels({1}));
 }
@@ -221,7 +227,7 @@ TEST_F(TriggerPorts, RemovesAChannelThatWasNeverMade) {
 }
 
 TEST_F(TriggerPorts, MakesTheSamePortsAgainManyTimes) {
-  manual_trigger_expect_ptz(PTZ_ENABLED);
+  manual_trigger_store_ptz(PtzState::kEnabled);
   for (int round = 0; round < 100; ++round) {
     manual_trigger_set_channel(1, true);
     manual_trigger_set_channel(2, false);
@@ -236,7 +242,7 @@ TEST_F(TriggerPorts, MakesTheSamePortsAgainManyTimes) {
 }
 
 TEST_F(TriggerPorts, WithdrawsAllEventsWhenCleared) {
-  manual_trigger_set_ptz(PTZ_ENABLED);
+  manual_trigger_set_ptz(PtzState::kEnabled);
   manual_trigger_set_channel(2, true);
   manual_trigger_clear();
   EXPECT_EQ(declared_channels(), Channels({}));

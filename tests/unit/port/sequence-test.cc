@@ -14,7 +14,7 @@ namespace {
 
 constexpr const char *kRefused = "Set action seq on incorrect port";
 constexpr std::int32_t kNotInThisTest = 2'000'000;  // half an hour: only a cancel ends the step
-constexpr std::int32_t kLongerThanPatienceMs = 30'000;
+constexpr std::int32_t kLongerThanTimeoutMs = 30'000;
 constexpr std::size_t kCancels = 100;
 constexpr std::int64_t kMicrosecondsPerMs = 1000;
 
@@ -79,7 +79,7 @@ TEST_F(Sequence, IsCancelledWhileNobodyTakesItsReports) {
   port_listener().wait_until_sent = [](GCancellable *cancelled, std::int64_t /*deadline*/) {
     ++waits;
     pollfd cancel = {.fd = g_cancellable_get_fd(cancelled), .events = POLLIN, .revents = 0};
-    EXPECT_EQ(poll(&cancel, 1, kLongerThanPatienceMs), 1);
+    EXPECT_EQ(poll(&cancel, 1, kLongerThanTimeoutMs), 1);
     g_cancellable_release_fd(cancelled);
   };
   const auto port = PortBuilder().output().set_up();
@@ -364,11 +364,11 @@ TEST_F(Sequence, CanBeCancelledWhileOthersKeepStartingNewOnes) {
   std::atomic<bool> stop = false;
   std::thread starter([&] {
     while (!stop) {
-      (void)drive(port, {{true, kLongerThanPatienceMs}});
+      (void)drive(port, {{true, kLongerThanTimeoutMs}});
     }
   });
   std::int64_t slowest = 0;
-  while (listener.times("done 1") < kCancels && slowest < kTestPatienceUs) {
+  while (listener.times("done 1") < kCancels && slowest < kTestTimeoutUs) {
     const std::int64_t begin = g_get_monotonic_time();
     EXPECT_TRUE(
         io_port_set_activelow(port.get(), !io_port_get_activelow(port.get(), false), false));
@@ -378,7 +378,7 @@ TEST_F(Sequence, CanBeCancelledWhileOthersKeepStartingNewOnes) {
   stop = true;
   starter.join();
   EXPECT_TRUE(io_port_set_activelow(port.get(), false, false));
-  EXPECT_LT(slowest, kTestPatienceUs);
+  EXPECT_LT(slowest, kTestTimeoutUs);
   EXPECT_TRUE(io_port_set_activelow(port.get(), true, false));
   EXPECT_FALSE(io_port_is_busy(port.get()));
   log.forget();

@@ -1,4 +1,5 @@
 // What a port is called and flagged, and the settings that users change while it runs.
+#include "port/ioport-private.h"
 #include "port/port-name.h"
 #include "support/port-fixture.h"
 
@@ -15,7 +16,7 @@ class PortDirection : public PortFixture {};
 TEST_F(PortSettings, OfANewPortAreTheDefaults) {
   const IOPortRef port(io_port_new());
   EXPECT_EQ(io_port_get_type(port.get()), PORT_INPUT);
-  EXPECT_EQ(io_port_get_backend(port.get()), 0);
+  EXPECT_EQ(port->backend, 0);
   EXPECT_FALSE(io_port_has_backend(port.get()));
   EXPECT_FALSE(io_port_get_id(port.get()));
   EXPECT_EQ(io_port_get_number(port.get()), -1);
@@ -212,9 +213,9 @@ TEST_F(PortNames, AreUtf8OfAtMost4096Bytes) {
 TEST_F(PortNames, ThatCanNotBeOnesAreLeftOutOfWhatIsRestored) {
   const auto port = PortBuilder().id("gate").input().names("Door", "").build();
   io_port_restore_name(port.get(), std::string(kPortNameMaxBytes + 1, 'x'), true);
-  EXPECT_TRUE(log.took_containing(G_LOG_LEVEL_WARNING, "Port gate: the input name is left out"));
+  EXPECT_TRUE(log.took_containing(G_LOG_LEVEL_WARNING, "Port gate: the input name is ignored"));
   io_port_restore_name(port.get(), "Caf\xe9", true);
-  EXPECT_TRUE(log.took_containing(G_LOG_LEVEL_WARNING, "Port gate: the input name is left out"));
+  EXPECT_TRUE(log.took_containing(G_LOG_LEVEL_WARNING, "Port gate: the input name is ignored"));
   EXPECT_EQ(io_port_get_name(port.get()), "Door");
 }
 

@@ -90,7 +90,7 @@ TEST_F(Supervision, OfAConfigurableOutputIsStoredForLater) {
 }
 
 TEST_F(Supervision, IsSwitchedInThePortWhereTheBackendNeedNotKnow) {
-  register_fake_supervised(FakeSlots::only_is_supervisable);
+  register_fake_supervised(FakeSlots::kOnlyIsSupervisable);
   const auto port = supervisable().set_up();
   EXPECT_TRUE(io_port_set_supervised(port.get(), true));
   EXPECT_TRUE(io_port_is_supervised(port.get()));
@@ -182,7 +182,7 @@ TEST_F(Supervision, HasNoRangesWhereTheBackendServesNone) {
   EXPECT_FALSE(io_port_get_supervised_ranges(PortBuilder().set_up().get(), &ranges));
   EXPECT_FALSE(io_port_set_supervised_ranges(not_supervisable().get(), {}, nullptr));
   EXPECT_FALSE(io_port_set_supervised_ranges(PortBuilder().set_up().get(), {}, nullptr));
-  register_fake_supervised(FakeSlots::no_ranges);
+  register_fake_supervised(FakeSlots::kNoRanges);
   const auto port = supervisable().set_up();
   EXPECT_FALSE(io_port_get_supervised_ranges(port.get(), &ranges));
   EXPECT_FALSE(io_port_set_supervised_ranges(port.get(), {}, nullptr));

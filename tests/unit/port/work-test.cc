@@ -18,41 +18,41 @@ class Work : public Registry {
   ~Work() override { io_port_wait_for_action_threads(); }
 
   // How many pieces of work the port has waited for, by the order in which they were begun.
-  void note_when_settled(const IOPortRef &port, int number) {
-    io_port_when_settled(port.get(), [this, number] { settled_.push_back(number); });
+  void note_when_idle(const IOPortRef &port, int number) {
+    io_port_when_idle(port.get(), [this, number] { idle_.push_back(number); });
   }
 
-  std::vector<int> settled_;
+  std::vector<int> idle_;
 };
 
-TEST_F(Work, IsSettledAtOnceWhereNothingIsUnderWay) {
+TEST_F(Work, IsIdleAtOnceWhereNothingIsUnderWay) {
   const auto port = PortBuilder().set_up();
-  note_when_settled(port, 1);
-  EXPECT_EQ(settled_, std::vector<int>{1});
+  note_when_idle(port, 1);
+  EXPECT_EQ(idle_, std::vector<int>{1});
 }
 
-TEST_F(Work, IsSettledOnTheMainLoopWhenItHasEndedElsewhere) {
+TEST_F(Work, IsIdleOnTheMainLoopWhenItHasEndedElsewhere) {
   const auto port = PortBuilder().set_up();
   auto work = std::make_unique<PortWork>(port.get());
-  std::thread::id settled_on;
-  io_port_when_settled(port.get(), [&] { settled_on = std::this_thread::get_id(); });
+  std::thread::id called_on;
+  io_port_when_idle(port.get(), [&] { called_on = std::this_thread::get_id(); });
   std::thread([&] { work.reset(); }).join();
-  EXPECT_EQ(settled_on, std::thread::id());
-  EXPECT_TRUE(iterate_until([&] { return settled_on == std::this_thread::get_id(); }));
+  EXPECT_EQ(called_on, std::thread::id());
+  EXPECT_TRUE(iterate_until([&] { return called_on == std::this_thread::get_id(); }));
 }
 
 TEST_F(Work, IsWaitedForOnlyByThoseWhoCameAfterIt) {
   const auto port = PortBuilder().set_up();
   auto first = std::make_unique<PortWork>(port.get());
-  note_when_settled(port, 1);
+  note_when_idle(port, 1);
   auto second = std::make_unique<PortWork>(port.get());
-  note_when_settled(port, 2);
+  note_when_idle(port, 2);
   first.reset();
-  EXPECT_TRUE(iterate_until([&] { return !settled_.empty(); }));
-  EXPECT_EQ(settled_, std::vector<int>{1});
+  EXPECT_TRUE(iterate_until([&] { return !idle_.empty(); }));
+  EXPECT_EQ(idle_, std::vector<int>{1});
   second.reset();
-  EXPECT_TRUE(iterate_until([&] { return settled_.size() == 2; }));
-  EXPECT_EQ(settled_, (std::vector<int>{1, 2}));
+  EXPECT_TRUE(iterate_until([&] { return idle_.size() == 2; }));
+  EXPECT_EQ(idle_, (std::vector<int>{1, 2}));
 }
 
 TEST_F(Work, KeepsItsPortUntilTheMainLoopKnows) {

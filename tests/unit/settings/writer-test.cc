@@ -62,7 +62,7 @@ class StorageWriter : public Settings {
 
   // Has the writer busy, so that what is asked for waits.
   static void hold_up() {
-    storage_writer_ask(gated_work);
+    storage_writer_request(gated_work);
     wait_until_begun();
   }
 };
@@ -78,8 +78,8 @@ TEST_F(StorageWriter, WorksOnAThreadOfItsOwn) {
 TEST_F(StorageWriter, DoesWorkThatWaitsOnce) {
   hold_up();
   for (int times = 0; times < 3; ++times) {
-    storage_writer_ask(other_work);
-    storage_writer_ask(gated_work);
+    storage_writer_request(other_work);
+    storage_writer_request(gated_work);
   }
   open_gate();
   EXPECT_TRUE(finish());
@@ -89,7 +89,7 @@ TEST_F(StorageWriter, DoesWorkThatWaitsOnce) {
 
 TEST_F(StorageWriter, GivesUpOnStorageThatHangs) {
   hold_up();
-  storage_writer_ask(other_work);
+  storage_writer_request(other_work);
   EXPECT_FALSE(storage_writer_finish(g_get_monotonic_time()));
   open_gate();
   EXPECT_TRUE(finish());
@@ -97,9 +97,9 @@ TEST_F(StorageWriter, GivesUpOnStorageThatHangs) {
 }
 
 TEST_F(StorageWriter, BeginsAnewAfterItsEnd) {
-  storage_writer_ask(other_work);
+  storage_writer_request(other_work);
   EXPECT_TRUE(finish());
-  storage_writer_ask(other_work);
+  storage_writer_request(other_work);
   EXPECT_TRUE(finish());
   EXPECT_EQ(other_runs, 2);
   EXPECT_TRUE(finish());

@@ -443,11 +443,11 @@ TEST_F(Iio, AttributesAreCutAtTheirLastNewline) {
 
 TEST_F(Iio, FlagsAreOneDigit) {
   write("flag", "");
-  EXPECT_EQ(sysfs_write_number(path("flag"), 1), SysfsWrite::done);
+  EXPECT_EQ(sysfs_write_number(path("flag"), 1), SysfsWrite::kDone);
   EXPECT_EQ(read("flag"), "1");
-  EXPECT_EQ(sysfs_write_number(path("flag"), 10), SysfsWrite::done);
+  EXPECT_EQ(sysfs_write_number(path("flag"), 10), SysfsWrite::kDone);
   EXPECT_EQ(read("flag"), "1");
-  EXPECT_EQ(sysfs_write(path("nowhere/flag"), "1"), SysfsWrite::not_opened);
+  EXPECT_EQ(sysfs_write(path("nowhere/flag"), "1"), SysfsWrite::kNotOpened);
 }
 
 }  // namespace

@@ -5,10 +5,10 @@
 
 #include <cstdint>
 
-inline constexpr std::int64_t kTestPatienceUs = 20'000'000;
+inline constexpr std::int64_t kTestTimeoutUs = 20'000'000;
 
 inline std::int64_t deadline_of_a_test() {
-  return g_get_monotonic_time() + kTestPatienceUs;
+  return g_get_monotonic_time() + kTestTimeoutUs;
 }
 
 // Runs the default main context until the condition holds. False: it never did.

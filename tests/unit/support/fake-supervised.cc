@@ -97,11 +97,11 @@ constexpr PortFunctions kNoRanges = without_ranges();
 
 const PortFunctions *functions_for(FakeSlots slots) {
   switch (slots) {
-    case FakeSlots::all:
+    case FakeSlots::kAll:
       return &kAll;
-    case FakeSlots::no_ranges:
+    case FakeSlots::kNoRanges:
       return &kNoRanges;
-    case FakeSlots::only_is_supervisable:
+    case FakeSlots::kOnlyIsSupervisable:
       return &kOnlyIsSupervisable;
   }
   return nullptr;

@@ -21,8 +21,8 @@ struct FakeSupervisedData : PortBackendData {
 };
 
 // Which operations of supervision the backend serves.
-enum class FakeSlots { all, no_ranges, only_is_supervisable };
+enum class FakeSlots { kAll, kNoRanges, kOnlyIsSupervisable };
 
 // After backends_register(). Ports made before keep the table that they have.
-void register_fake_supervised(FakeSlots slots = FakeSlots::all);
+void register_fake_supervised(FakeSlots slots = FakeSlots::kAll);
 FakeSupervisedData &fake_record(const IOPortRef &port);

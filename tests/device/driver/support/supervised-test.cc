@@ -11,16 +11,17 @@ std::string range(const char *state, unsigned int lower, unsigned int upper) {
 
 // The daemon leaves the direction of the line to the measured path as it finds it.
 SupervisedTest::SupervisedTest() {
-  sim_.export_low(kSioCtrl);
+  sim_.export_low(LINE_SIO_CTRL);
 }
 
 std::string SupervisedTest::input_pins() const {
-  return "<input pin='" + sim_.number_text(kInput) + "'/><io_ctrl pin='" +
-         sim_.number_text(kIoCtrl) + "'/><sio_ctrl pin='" + sim_.number_text(kSioCtrl) + "'/>";
+  return "<input pin='" + sim_.number_text(LINE_INPUT) + "'/><io_ctrl pin='" +
+         sim_.number_text(LINE_IO_CTRL) + "'/><sio_ctrl pin='" + sim_.number_text(LINE_SIO_CTRL) +
+         "'/>";
 }
 
 std::string SupervisedTest::configurable_pins() const {
-  return input_pins() + "<output pin='" + sim_.number_text(kOutput) + "'/>";
+  return input_pins() + "<output pin='" + sim_.number_text(LINE_OUTPUT) + "'/>";
 }
 
 std::string SupervisedTest::all_ranges() {
@@ -39,11 +40,11 @@ std::string SupervisedTest::all_ranges() {
 }
 
 void SupervisedTest::expect_path(bool measured) const {
-  EXPECT_EQ(sim_.level(kSioCtrl), measured);
-  EXPECT_EQ(sim_.level(kIoCtrl), !measured);
+  EXPECT_EQ(sim_.level(LINE_SIO_CTRL), measured);
+  EXPECT_EQ(sim_.level(LINE_IO_CTRL), !measured);
 }
 
 void SupervisedTest::expect_no_path() const {
-  EXPECT_FALSE(sim_.level(kSioCtrl));
-  EXPECT_FALSE(sim_.level(kIoCtrl));
+  EXPECT_FALSE(sim_.level(LINE_SIO_CTRL));
+  EXPECT_FALSE(sim_.level(LINE_IO_CTRL));
 }

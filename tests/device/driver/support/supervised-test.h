@@ -7,7 +7,7 @@
 
 class SupervisedTest : public DeviceTest {
  protected:
-  enum Line { kInput, kOutput, kIoCtrl, kSioCtrl, kLines };
+  enum Line { LINE_INPUT, LINE_OUTPUT, LINE_IO_CTRL, LINE_SIO_CTRL, LINE_COUNT };
 
   // Levels in the middle of the ranges of all_ranges().
   static constexpr unsigned int kShort = 100;

@@ -10,8 +10,8 @@ gboolean look_again(gpointer /*user_data*/) {
 }
 }  // namespace
 
-bool wait_until(const std::function<bool()> &condition, gint64 patience) {
-  const gint64 deadline = g_get_monotonic_time() + patience;
+bool wait_until(const std::function<bool()> &condition, gint64 timeout) {
+  const gint64 deadline = g_get_monotonic_time() + timeout;
   const Source alarm(g_timeout_add(kLook, look_again, nullptr));
   while (!condition()) {
     if (g_get_monotonic_time() > deadline) {
