@@ -1,7 +1,7 @@
 """The simulated device of the demo, and what happens in it."""
 
 from pathlib import Path
-from typing import Any, Callable, NamedTuple, Optional
+from typing import Any, Callable, NamedTuple
 
 from gi.repository import GLib
 

@@ -26,7 +26,7 @@ service_packages=(
   python3-pytest-xdist strace umockdev
 )
 clang_packages=("clang-$llvm" "libclang-rt-$llvm-dev" "llvm-$llvm")
-lint_packages=(libxml2-utils shellcheck)
+lint_packages=(libxml2-utils python3-flake8 shellcheck)
 [ "$llvm" != "$format_version" ] || lint_packages+=("clang-format-$format_version")
 tidy_packages=("clang-$llvm" "clang-tidy-$llvm" "clang-tools-$llvm")
 device_packages=(

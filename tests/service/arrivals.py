@@ -32,7 +32,7 @@ class Arrivals:
             data = os.read(self._fd, 65536)
             while data:
                 length = _HEADER.unpack_from(data)[3]
-                data = data[_HEADER.size :]
+                data = data[_HEADER.size:]
                 names.append(os.fsdecode(data[:length].rstrip(b"\0")))
                 data = data[length:]
         return names

@@ -59,7 +59,7 @@ class Terminal:
         """The lines as they stand there now, without styles."""
         written = self.read()
         lines = [""] * 200
-        parts = _MOVE.split(written[written.rfind("\x1b[2J") :])
+        parts = _MOVE.split(written[written.rfind("\x1b[2J"):])
         for row, text in zip(parts[1::2], parts[2::2]):
             # One write may end within a line.
             lines[int(row) - 1] = _SGR.sub("", text.split("\x1b[K")[0]).rstrip("\r\n")

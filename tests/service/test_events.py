@@ -82,7 +82,8 @@ def test_the_events_of_a_configurable_port_follow_its_direction(start):
             "either",
             0,
             kind="io_ctrl",
-            extra='<event declaration="in.only" output="FALSE"/><event declaration="out.only" input="False"/>',
+            extra='<event declaration="in.only" output="FALSE"/>'
+            '<event declaration="out.only" input="False"/>',
         )
     )
     assert producer.ids("in.only") and not producer.ids("out.only")

@@ -5,7 +5,7 @@ import time
 import pytest
 
 from harness import Device, hwdesc, port, wait_for
-from neighbours import IoBox, Neighbourhood, barrier, neighbourhood_fixture
+from neighbours import IoBox, barrier, neighbourhood_fixture
 
 neighbourhood = pytest.fixture(neighbourhood_fixture)
 

@@ -1,6 +1,5 @@
 """Manual triggers, against a played video streamer and a played camera-control coordinator."""
 
-import time
 import pytest
 
 from harness import Device, hwdesc, port, wait_for

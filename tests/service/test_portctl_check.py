@@ -108,7 +108,9 @@ MISTAKES = {
         "must stand first",
     ),
     "optional in capitals": Mistake('optional="true"', 'optional="True"', "", "in small letters"),
-    "a port in a port": Mistake("  </port>\n  <port name=\"relay\"", '  <port name="relay"', "<port", "close that first"),
+    "a port in a port": Mistake(
+        '  </port>\n  <port name="relay"', '  <port name="relay"', "<port", "close that first"
+    ),
     "an empty range": Mistake('lower="100" upper="200"', 'lower="200" upper="100"', "", "below upper"),
     "lost text": Mistake("<ports>\n", "<ports>\nmine\n", "mine", "text between tags"),
 }  # fmt: skip

@@ -115,7 +115,9 @@ def test_every_key_is_read_and_written_back(device):
 
 
 @pytest.mark.parametrize(
-    "name", ["  spaces  ", "\fform", "\f \f\\f", "\ttab", " \f", "Tür \N{DOOR}", "a\nb\tc\\d", "[both]", "#none", "", "x" * 4096]
+    "name",
+    ["  spaces  ", "\fform", "\f \f\\f", "\ttab", " \f", "Tür \N{DOOR}", "a\nb\tc\\d", "[both]",
+     "#none", "", "x" * 4096],  # fmt: skip
 )
 def test_odd_names_survive_a_restart(device, name):
     device.start()
