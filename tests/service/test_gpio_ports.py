@@ -60,17 +60,6 @@ def test_an_output_gets_direction_and_level_in_one_step_and_then_its_sense(devic
     lines.wait(*LOW_OUTPUT_WRITES)
 
 
-def test_an_output_on_an_inverted_line_starts_high_before_it_is_active_low(device, lines):
-    start(device, gpio("output", output='pin="12" inverted="true"'))
-    lines.wait("gpio12/direction high", "gpio12/active_low 1")
-
-
-@pytest.mark.parametrize("word", ["TRUE", "True", "yes", "1", ""])
-def test_only_true_in_lower_case_inverts(device, lines, word):
-    start(device, gpio("output", output=f'pin="12" inverted="{word}"'))
-    lines.wait(*LOW_OUTPUT_WRITES)
-
-
 def test_an_active_low_output_comes_up_inactive_again(device, lines):
     start(device, gpio("output", output='pin="12"'))
     device.call("SetActive", "ubs", 0, False, "open")
@@ -131,12 +120,6 @@ def test_a_line_exported_before_is_not_given_back(device, lines):
     assert lines.take() == list(LOW_OUTPUT_WRITES)
 
 
-def test_edges_that_somebody_left_on_are_off_before_the_line_is_an_output(device, tree):
-    tree.line(OUTPUT, edge="both\n")
-    start(device, gpio("output", output='pin="12"'))
-    tree.wait("gpio12/edge none", *LOW_OUTPUT_WRITES)
-
-
 # Levels
 
 
@@ -145,14 +128,6 @@ def test_an_input_reads_its_line(device, lines):
     for level in (0, 1, 0):
         lines.set_value(INPUT, level)
         assert state(device) is bool(level)
-
-
-def test_a_change_that_a_client_finds_first_is_reported(device, lines):
-    start(device, gpio("input", input='pin="11"'))
-    with device.signals("PortChanged") as changed:
-        lines.set_value(INPUT, 1)
-        assert state(device)
-        assert changed.wait().state
 
 
 def test_an_output_is_driven_and_reported(device, lines):
@@ -184,13 +159,6 @@ def test_a_sequence_drives_the_line(device, lines):
         done.wait()
     assert len(lines.take()) == 3
     assert lines.read(OUTPUT, "value") == "1\n"
-
-
-@pytest.mark.parametrize("text", ["", "x\n"])
-def test_a_line_that_cannot_be_read_is_active(device, tree, text):
-    tree.line(INPUT, value=text)
-    start(device, gpio("input", input='pin="11"'))
-    assert state(device) is True
 
 
 # Direction
@@ -276,25 +244,6 @@ def test_a_document_that_forgets_the_lines(device, tree):
     start(device, gpio("io_ctrl"))
     assert device.log_count("Port terminal has no") == 3
     call_everything(device, numbers=(0,))
-
-
-def test_the_failure_has_number_and_alias_and_only_the_alias_is_looked_for(device, lines):
-    start(device, gpio("input", input='pin="11" alias="alarm"'))
-    device.wait_log("Failed to allocate pin 11/alarm")
-    assert lines.take() == []
-
-
-def test_an_unknown_section_is_logged_and_ignored(device, lines):
-    start(device, configurable(**{"io-ctrl": 'pin="14"'}))
-    assert device.log_count("Could not parse backend data!") == 1
-    assert len(lines.take()) == 7
-
-
-def test_a_line_without_edges_can_be_read(device, tree):
-    tree.line(INPUT, edge=None, value="1\n")
-    start(device, gpio("input", input='pin="11"'))
-    assert state(device) is True
-    assert device.log_count("GPIO 11 has no edge interrupts") == 1
 
 
 # Optional ports

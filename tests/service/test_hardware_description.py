@@ -57,13 +57,6 @@ def test_nobody_is_asked_without_a_filter(device, hardware_id):
     assert hardware_id.calls("ReadBootblockParam") == []
 
 
-def test_an_empty_filter_keeps_the_port(device, hardware_id):
-    device.conf(hwdesc(port("a", 0, hwid="")))
-    device.start()
-    assert identifiers(device) == ["a"]
-    assert device.log_count(NO_HARDWARE_ID) == 1
-
-
 def test_without_a_hardware_id_ports_are_kept(device):
     device.conf(hwdesc(port("a", 0, hwid="B9"), port("b", 1)))
     device.start()

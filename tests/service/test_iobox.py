@@ -308,17 +308,6 @@ def test_a_method_that_is_never_answered_holds_start_up_once_and_not_for_every_p
 # Line states
 
 
-def test_a_cut_line_of_a_plain_input_reads_inactive_and_a_shorted_one_active(device, neighbourhood):
-    box = IoBox(neighbourhood, device)
-    device.start()
-    with device.signals() as changes:
-        for word, active in (("short", True), ("cut", False), ("closed", True), ("open", False)):
-            box.report(INPUT, word)
-            assert changes.wait(lambda change: change.port == INPUT).state is active
-            assert state(device, INPUT) is active
-            changes.take()
-
-
 def test_a_word_that_is_not_known_is_warned_of_and_reads_undefined(device, neighbourhood):
     box = IoBox(neighbourhood, device)
     device.start()

@@ -4,10 +4,12 @@ import pytest
 
 from converters import (
     Converters,
+    come_back_fifty_times,
     expect_supervised_error,
     processor_time,
     range_element,
     readout,
+    restart_supervised,
     start,
     supervise,
     supervised,
@@ -242,29 +244,22 @@ def test_the_integration_time_is_given_in_seconds(device, converters):
 
 
 def test_a_dropped_port_holds_nothing_and_comes_back_fifty_times(device, converters):
-    start(device, interrupt(optional=True))
-    supervised(device, "SetSupervisedRanges", "usuu", 0, "closed", 110, 190)
-    supervise(device)
-    files = converters.open_files()
-    descriptors = len(device.descriptors())
-    for level in range(120, 170):
-        device.call("DropIOPorts", "as", ["line0"])
-        assert converters.open_files() == []
+    def come_back(level: int) -> None:
         assert armed(converters)[2:] == ["0", "0"]
         set_raw(converters, level)
         device.call("RefreshIOPorts")
         assert armed(converters) == ["190", "110", "1", "1"]
-        assert readout(device) == ("closed", level)
-    assert converters.open_files() == files
-    assert len(device.descriptors()) == descriptors
+
+    start(device, interrupt(optional=True))
+    supervised(device, "SetSupervisedRanges", "usuu", 0, "closed", 110, 190)
+    supervise(device)
+    come_back_fifty_times(device, converters, come_back, first=120)
 
 
 def test_supervision_and_ranges_outlive_a_restart(device, converters):
     start(device, interrupt())
     supervised(device, "SetSupervisedRanges", "usuu", 0, "closed", 110, 190)
     supervise(device)
-    device.restart()
-    wait_for(lambda: device.bus.has_owner("com.kelv.IOSupervised.Supervised"), "the interface")
-    assert converters.control_pins() == "01"
+    restart_supervised(device, converters)
     wait_armed(converters, "190", "110", "1", "1")
     assert readout(device) == ("closed", 150)

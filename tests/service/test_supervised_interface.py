@@ -175,13 +175,6 @@ def test_a_bad_range_is_refused_and_changes_nothing(
     assert device.read_settings() == settings
 
 
-@pytest.mark.parametrize("lower, upper", [(0, 65535), (2**32 - 1, 5), (2**31, 0)])
-def test_limits_are_read_as_signed_numbers(device, converters, lower, upper):
-    start(device, spi())
-    supervised(device, "SetSupervisedRanges", "usuu", 0, "cut", lower, upper)
-    assert supervised(device, "GetSupervisedRanges", "u", 0) == [("cut", lower, upper)]
-
-
 def test_the_value_that_a_port_has_is_not_stored_again(device, converters):
     start(device, spi())
     settings = device.path("/etc/portd/portd.conf")

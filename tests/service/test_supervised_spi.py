@@ -8,6 +8,7 @@ from converters import (
     OUTPUT,
     SIO_CTRL,
     Converters,
+    come_back_fifty_times,
     expect_supervised_error,
     range_element,
     readout,
@@ -41,13 +42,6 @@ def converters(converters) -> Converters:
 def spi(elements: str = RANGES, **options) -> str:
     device = '<device path="/run/converters/spidev0"/><address value="1f"/>'
     return supervised_port("spi", f"{device}{elements}", **options)
-
-
-def test_a_readout_sends_the_address_and_reads_twelve_bits(device, converters):
-    start(device, spi())
-    converters.answer(0xABC)
-    assert readout(device) == ("cut", 0xABC)
-    assert converters.spi_calls() == ["bits 8", "message 1f 00, 2"]
 
 
 def test_the_speed_is_set_when_given(device, converters):
@@ -155,20 +149,15 @@ def test_a_missing_device_parks_an_optional_port_until_it_is_there(device, conve
 
 
 def test_a_dropped_port_closes_its_device_and_comes_back_fifty_times(device, converters):
+    def come_back(level: int) -> None:
+        device.call("RefreshIOPorts")
+        converters.answer(level)
+
     start(device, spi(optional=True))
     supervised(device, "SetSupervisedRanges", "usuu", 0, "short", 0x10, 0x20)
     supervise(device)
-    files = converters.open_files()
-    descriptors = len(device.descriptors())
-    for level in range(0x100, 0x132):
-        device.call("DropIOPorts", "as", ["line0"])
-        assert converters.open_files() == []
-        device.call("RefreshIOPorts")
-        converters.answer(level)
-        assert readout(device) == ("closed", level)
-        assert converters.control_pins() == "01"
-    assert converters.open_files() == files
-    assert len(device.descriptors()) == descriptors
+    come_back_fifty_times(device, converters, come_back, first=0x100)
+    assert converters.control_pins() == "01"
     assert ("short", 0x10, 0x20) in supervised(device, "GetSupervisedRanges", "u", 0)
     reads = len(converters.spi_calls())
     wait_for(lambda: len(converters.spi_calls()) > reads, "the watch")

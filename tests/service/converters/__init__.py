@@ -4,7 +4,7 @@ import os
 import struct
 import subprocess
 from pathlib import Path
-from typing import Any, Optional
+from typing import Any, Callable, Optional
 
 from gpio_tree import GpioTree
 from harness import DBusError, Device, hwdesc, port, wait_for
@@ -78,6 +78,28 @@ def start(device: Device, *ports: str) -> Device:
     device.start()
     device.wait_name(SUPERVISED)
     return device
+
+
+def come_back_fifty_times(
+    device: Device, converters: "Converters", come_back: Callable[[int], None], first: int = 100
+) -> None:
+    """Drops the port and lets `come_back` refresh it at a level at which its line is closed."""
+    files = converters.open_files()
+    descriptors = len(device.descriptors())
+    for level in range(first, first + 50):
+        device.call("DropIOPorts", "as", ["line0"])
+        assert converters.open_files() == []
+        come_back(level)
+        wait_readout(device, "closed", level)
+    assert converters.open_files() == files
+    assert len(device.descriptors()) == descriptors
+
+
+def restart_supervised(device: Device, converters: "Converters") -> None:
+    """Supervision outlives the restart, or the line would be led to the plain input."""
+    device.restart()
+    wait_for(lambda: device.bus.has_owner(SUPERVISED), "the interface")
+    assert converters.control_pins() == "01"
 
 
 def processor_time(device: Device) -> float:
