@@ -4,6 +4,7 @@ import argparse
 import json
 import os
 import shutil
+import signal
 import statistics
 import subprocess
 import sys
@@ -24,6 +25,9 @@ CONTROL_CALL = (CONTROL, CONTROL_PATH, CONTROL)
 LAST_NAME = "com.kelv.Configuration.Legacy.IOControl1.IOPort"
 SOCKET = "/run/dbus/system_bus_socket"
 SYNC_MS = 20
+POLL_MS = 10
+STEP_MS = 2
+INSTRUCTED_CALLS = 1000
 
 
 class Row(NamedTuple):
@@ -47,10 +51,9 @@ class Row(NamedTuple):
 class BenchDevice(Device):
     """A device whose programs may run with a preloaded library, and which may run the bare service."""
 
-    def __init__(self, folder: Path, build: Path, preload: Optional[dict[str, str]] = None):
+    def __init__(self, folder: Path, build: Path):
         super().__init__(folder, build / "src/portd")
         self.build = build
-        self._preload = preload or {}
         names = "".join(f'<allow own="{name}"/>' for name in BARE)
         policy = folder / "bench.conf"
         policy.write_text(
@@ -59,15 +62,16 @@ class BenchDevice(Device):
         )
         self.bus = SystemBus(self.sandbox, [POLICY, policy])
 
-    def _environment(self) -> dict[str, str]:
-        return {**super()._environment(), **self._preload}
+    def preload(self, library: str, **variables: str) -> None:
+        self.environment = {"LD_PRELOAD": str(self.build / "bench" / library), **variables}
 
-    def start_bare(self, *options: str) -> subprocess.Popen:
+    def start_bare(self, *options: str, launcher: Iterable[str] = ()) -> subprocess.Popen:
         self.bus.start()
         program = str(self.build / "bench/bare-service")
         process = self.sandbox.spawn(
-            [program, *options, *BARE], self._environment(), subprocess.DEVNULL, subprocess.DEVNULL
-        )
+            [*launcher, program, *options, *BARE], self._environment(),
+            subprocess.DEVNULL, subprocess.DEVNULL,
+        )  # fmt: skip
         for name in BARE:
             self.bus.wait_name(name)
         return process
@@ -117,11 +121,11 @@ class Bench:
     def close(self) -> None:
         shutil.rmtree(self._folder, ignore_errors=True)
 
-    def device(self, conf: str, preload: Optional[dict[str, str]] = None) -> BenchDevice:
+    def device(self, conf: str) -> BenchDevice:
         self._devices += 1
         folder = self._folder / str(self._devices)
         folder.mkdir()
-        device = BenchDevice(folder, self._build, preload)
+        device = BenchDevice(folder, self._build)
         device.conf(conf)
         return device
 
@@ -130,11 +134,7 @@ class Bench:
         device = self.device(conf)
         counts = device.write("/run/counts", "")
         counts.chmod(0o666)
-        device._preload = {
-            "LD_PRELOAD": str(self._build / "bench/slow-sync.so"),
-            "BENCH_SYNC_MS": str(sync_ms),
-            "BENCH_COUNTS": "/run/counts",
-        }
+        device.preload("slow-sync.so", BENCH_SYNC_MS=str(sync_ms), BENCH_COUNTS="/run/counts")
         return device, counts
 
     # Calls
@@ -174,6 +174,34 @@ class Bench:
         many.close()
         yield Row("GetState, last of 1,000 ports", "of 10", ratio_of(pairs), 1.10)
 
+    def instructions(self) -> Iterable[Row]:
+        """What a call costs in instructions, which no other program disturbs."""
+        if not shutil.which("valgrind"):
+            return
+        mine = self._instructions_of(CONTROL_CALL, "GetState", lambda device, launcher:
+                                     device.start(launcher=launcher))  # fmt: skip
+        empty = self._instructions_of(BARE_CALL, "Empty", lambda device, launcher:
+                                      device.start_bare(launcher=launcher))  # fmt: skip
+        yield Row("instructions of a GetState", "an empty method", mine / empty, None,
+                  detail=f"{mine:.0f}")  # fmt: skip
+
+    def _instructions_of(self, call: tuple[str, str, str], method: str, start: Callable) -> float:
+        totals = []
+        for count in (INSTRUCTED_CALLS, 2 * INSTRUCTED_CALLS):
+            device = self.device(checked_outputs(10))
+            counted = device.write("/run/callgrind", "")
+            counted.chmod(0o666)  # the daemon gives its rights up
+            process = start(device, ("valgrind", "--tool=callgrind", "--callgrind-out-file=/run/callgrind"))
+            device.measure(call, method, "(uint32 1,)", count)
+            if process is device:
+                device.stop()
+            else:
+                process.terminate()
+                process.wait()
+            totals.append(int(counted.read_text().rsplit("totals: ", 1)[1].split()[0]))
+            device.close()
+        return (totals[1] - totals[0]) / INSTRUCTED_CALLS
+
     # Storage
 
     def set_states(self) -> Iterable[Row]:
@@ -187,6 +215,55 @@ class Bench:
         replaced = counts.read_text().count("r")
         device.close()
         yield Row("files replaced by 1,000 SetState", "", replaced, 0)
+
+    def saves(self) -> Iterable[Row]:
+        """A name until it is on storage, beside what has to be done for that at least."""
+        device, counts = self.slow(checked_outputs(10), 0)
+        device.start()
+        device.call("SetName", "ubs", 0, False, "the first name")
+        pairs = []
+        for n in range(self._rounds * 10):
+            wait_for(lambda: quiet_for(device.pid, 0.05), "the daemon to come to rest")
+            counts.write_text("")
+            begun = time.perf_counter()
+            device.call("SetName", "ubs", 0, False, f"name {n}")
+            while counts.stat().st_size < len("srs"):
+                pass
+            mine = time.perf_counter() - begun
+            pairs.append((mine, replace_file(device.folder / "least", device.read_settings())))
+        device.close()
+        detail = f"{statistics.median(mine for mine, _ in pairs) * 1000:.2f} ms"
+        yield Row("SetName until saved, 10 ports", "write+fsync+rename+fsync", ratio_of(pairs), 1.5,
+                  detail=detail)  # fmt: skip
+
+    def polls(self) -> Iterable[Row]:
+        """How much later than its interval a polled input is seen while settings are stored."""
+        polled = port("flag", 16, backend="sysfs",
+                      device={"path": "/run/flag", "timeout": str(POLL_MS)})  # fmt: skip
+        named = [port(f"out{n}", n, "output", "check") for n in range(16)]
+        device, _counts = self.slow(hwdesc(*named, polled), SYNC_MS)
+        device.write("/run/flag", "0")
+        device.start()
+        quiet = self._longest_poll(device, lambda turn: None)
+        worst = self._longest_poll(device, lambda turn: [
+            device.begin_call("SetName", "ubs", n, False, f"name {turn}") for n in range(16)
+        ])  # fmt: skip
+        device.close()
+        yield Row("lateness of a polled input beside the same", "", worst - POLL_MS, 5, unit="ms",
+                  detail=f"quiet {quiet - POLL_MS:.2f} ms")  # fmt: skip
+
+    def _longest_poll(self, device: BenchDevice, disturb: Callable[[int], object]) -> float:
+        longest = 0.0
+        with device.signals() as changes:
+            for turn in range(self._rounds * 10):
+                disturb(turn)
+                time.sleep(turn % 10 / 1000)  # anywhere in the interval
+                begun = time.perf_counter()
+                device.write("/run/flag", str(1 - turn % 2))
+                changes.wait(lambda change: change.port == 16)
+                longest = max(longest, (time.perf_counter() - begun) * 1000)
+                changes.received.clear()
+        return longest
 
     def storm_of_names(self) -> Iterable[Row]:
         """What a client that reads sees while another one renames ports on slow storage."""
@@ -294,11 +371,39 @@ class Bench:
         yield Row("PSS, 64 ports", "the bare service", ratio_of(pairs), 1.15,
                   detail=f"{pairs[0][0]} kB")  # fmt: skip
         device = self.device(outputs(1024, events=True))
+        answer = device.write("/run/heap", "")
+        answer.chmod(0o666)
+        device.preload("heap-probe.so", BENCH_HEAP="/run/heap")
         device.start()
         rss = rollup(device.pid, "Rss")
+        os.kill(device.pid, signal.SIGUSR2)
+        wait_for(lambda: answer.read_text().endswith("\n"), "the size of the heap")
+        heap = int(answer.read_text()) // 1024
         device.close()
-        yield Row("RSS, 1,024 ports with an event each", "the bare service", rss / bare_rss, None,
-                  detail=f"{rss} kB")  # fmt: skip
+        yield Row("RSS, 1,024 ports with an event each", "live heap + bare service",
+                  rss / (heap + bare_rss), 1.5, detail=f"{rss} kB, {heap} kB live")  # fmt: skip
+
+    def steps(self) -> Iterable[Row]:
+        """How late the steps of a sequence are, beside a thread of the daemon that only sleeps."""
+        device = self.device(checked_outputs(1))
+        answer = device.write("/run/steps", "")
+        answer.chmod(0o666)
+        device.preload("step-probe.so", BENCH_STEPS="/run/steps")
+        device.start()
+        count = self._calls // 4
+        with device.signals("ActionSequenceDone") as done:
+            steps = [(bool(n % 2), STEP_MS) for n in range(count)]
+            device.call("StartActionSequence", "uba(bi)", 0, False, steps)
+            wait_for(lambda: done.received, "the end of the sequence", 120)
+        device.stop()
+        late = {"step": [], "work": [], "sleep": []}
+        for line in answer.read_text().splitlines():
+            kind, ns = line.split()
+            late[kind].append(int(ns) / 1000)
+        device.close()
+        step, work, sleep = (percentile_99(late[kind]) for kind in ("step", "work", "sleep"))
+        yield Row("step lateness p99, 2 ms steps", "clock_nanosleep beside it", step / sleep, 1.5,
+                  detail=f"{step:.0f} us; the step itself takes {work:.0f} us")  # fmt: skip
 
     def idle(self) -> Iterable[Row]:
         ports = [port(f"p{n}", n, "output", ("null", "virtual", "check")[n % 3]) for n in range(64)]
@@ -319,9 +424,28 @@ class Bench:
                   unit="KiB")  # fmt: skip
 
     def rows(self) -> list[Callable[[], Iterable[Row]]]:
-        return [self.calls, self.many_ports, self.set_states, self.storm_of_names,
-                self.names_at_once, self.starts, self.start_per_port, self.memory, self.idle,
-                self.size]  # fmt: skip
+        return [self.calls, self.many_ports, self.instructions, self.set_states, self.saves, self.storm_of_names,
+                self.polls, self.names_at_once, self.starts, self.start_per_port, self.memory,
+                self.idle, self.steps, self.size]  # fmt: skip
+
+
+def replace_file(path: Path, text: str) -> float:
+    """Seconds that it takes at least to have these contents on storage."""
+    temporary = path.with_suffix(".tmp")
+    begun = time.perf_counter()
+    fd = os.open(temporary, os.O_WRONLY | os.O_CREAT | os.O_TRUNC, 0o644)
+    os.write(fd, text.encode())
+    os.fsync(fd)
+    os.close(fd)
+    os.rename(temporary, path)
+    fd = os.open(path.parent, os.O_RDONLY)
+    os.fsync(fd)
+    os.close(fd)
+    return time.perf_counter() - begun
+
+
+def percentile_99(values: list[float]) -> float:
+    return statistics.quantiles(values, n=100)[98]
 
 
 def rollup(pid: int, field: str) -> int:

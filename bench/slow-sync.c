@@ -24,13 +24,15 @@ int fsync(int fd) {
   const char *text = getenv("BENCH_SYNC_MS");
   long ms = text ? atol(text) : 0;
   struct timespec wait = {ms / 1000, ms % 1000 * 1000000};
-  note('s');
   nanosleep(&wait, NULL);
-  return real(fd);
+  int result = real(fd);
+  note('s');
+  return result;
 }
 
 int rename(const char *from, const char *to) {
-  int (*real)(const char *, const char *) = (int (*)(const char *, const char *))dlsym(RTLD_NEXT, "rename");
+  int (*real)(const char *, const char *) =
+      (int (*)(const char *, const char *))dlsym(RTLD_NEXT, "rename");
   note('r');
   return real(from, to);
 }

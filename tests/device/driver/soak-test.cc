@@ -1,4 +1,4 @@
-// Some thousand mixed requests: the daemon is as big afterwards as it was before.
+// A thousand mixed requests: the daemon is as big afterwards as it was before.
 #include "support/mock-iio.h"
 #include "support/mock-spi.h"
 #include "support/rights.h"
@@ -7,8 +7,8 @@
 namespace {
 
 constexpr int kKinds = 24;  // of requests
-constexpr int kWarmUp = 20 * kKinds;
-constexpr int kRequests = 100 * kKinds;
+constexpr int kWarmUp = 10 * kKinds;
+constexpr int kRequests = 40 * kKinds;
 constexpr long kGrowthKb = 64;
 constexpr int kSampled = 2;  // channels of the converters
 constexpr int kWatched = 5;
