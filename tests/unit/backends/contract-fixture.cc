@@ -27,8 +27,7 @@ std::vector<Property> join(std::vector<Property> first, const std::vector<Proper
 }
 
 void set_spi_level(unsigned int level) {
-  fake_spidev().received[0] = static_cast<std::uint8_t>(level >> 4);
-  fake_spidev().received[1] = static_cast<std::uint8_t>(level << 4);
+  fake_spidev().answer_sample(static_cast<int>(level));
 }
 
 std::vector<Property> pins() {
@@ -45,7 +44,7 @@ std::vector<Property> ranges() {
 
 // Where the next backend would be in the table.
 constexpr auto kToyKind = static_cast<BackendKind>(BACKEND_CHECK + 1);
-constexpr Backend kToyRow = {"toy", kToyKind, &kToyBackend};
+constexpr Backend kToyRow = {"recipe", kToyKind, &kToyBackend};
 
 const std::vector<BackendUnderTest> kPlain = {
     {.name = "virtual", .word = "virtual", .kind = BACKEND_VIRTUAL},
@@ -70,11 +69,11 @@ const std::vector<BackendUnderTest> kPlain = {
      .type = PORT_INPUT},
     {.name = "null", .word = "null", .kind = BACKEND_NULL},
     {.name = "check", .word = "check", .kind = BACKEND_CHECK},
-    {.name = "toy",
-     .word = "toy",
+    {.name = "recipe",
+     .word = "recipe",
      .kind = kToyKind,
      .furnish = &World::make_flag,
-     .properties = &World::toy_file,
+     .properties = &World::recipe_file,
      .activate = &World::raise_flag,
      .type = PORT_INPUT},
 };
@@ -160,7 +159,7 @@ std::vector<Property> World::flag() const {
   return {{"device", "path", path("flag")}, {"device", "timeout", "1"}};
 }
 
-std::vector<Property> World::toy_file() const {
+std::vector<Property> World::recipe_file() const {
   return {{"file", "path", path("flag")}};
 }
 

@@ -28,7 +28,7 @@ class World : public IioBench {
   std::vector<Property> nothing() const { return {}; }
   std::vector<Property> lines() const;
   std::vector<Property> flag() const;
-  std::vector<Property> toy_file() const;
+  std::vector<Property> recipe_file() const;
   std::vector<Property> converter() const;
   std::vector<Property> supervised_spi() const;
   std::vector<Property> supervised_iio() const;

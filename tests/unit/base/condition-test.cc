@@ -10,7 +10,9 @@ namespace {
 
 constexpr std::int64_t kMillisecondUs = 1000;
 
-TEST(MonotonicCondition, WakesAWaiterThatIsNotified) {
+// Waits, with the given call, for another thread that notifies.
+template <typename Wait>
+void wait_for_notifier(Wait wait) {
   MonotonicCondition condition;
   std::mutex mutex;
   bool ready = false;
@@ -22,11 +24,15 @@ TEST(MonotonicCondition, WakesAWaiterThatIsNotified) {
   {
     std::unique_lock lock(mutex);
     while (!ready) {
-      condition.wait(lock);
+      wait(condition, lock);
     }
     EXPECT_TRUE(lock.owns_lock());
   }
   notifier.join();
+}
+
+TEST(MonotonicCondition, WakesAWaiterThatIsNotified) {
+  wait_for_notifier([](auto &condition, auto &lock) { condition.wait(lock); });
 }
 
 TEST(MonotonicCondition, WakesEveryWaiter) {
@@ -79,23 +85,11 @@ TEST(MonotonicCondition, DoesNotWaitForADeadlineThatHasPassed) {
 }
 
 TEST(MonotonicCondition, IsWokenBeforeALaterDeadline) {
-  MonotonicCondition condition;
-  std::mutex mutex;
-  bool ready = false;
-  std::thread notifier([&] {
-    const std::lock_guard lock(mutex);
-    ready = true;
-    condition.notify_all();
-  });
   const std::int64_t deadline = deadline_of_a_test();
-  {
-    std::unique_lock lock(mutex);
-    while (!ready && g_get_monotonic_time() < deadline) {
-      condition.wait_until(lock, deadline);
-    }
-  }
-  notifier.join();
-  EXPECT_LT(g_get_monotonic_time(), deadline);
+  wait_for_notifier([&](auto &condition, auto &lock) {
+    condition.wait_until(lock, deadline);
+    ASSERT_LT(g_get_monotonic_time(), deadline);
+  });
 }
 
 }  // namespace

@@ -426,32 +426,25 @@ TEST_F(EventValues, AKeyThatIsOfNoUseCostsTheEventAndNotTheDaemon) {
   }
 }
 
-using EventValuesDeathTest = EventValues;
+class EventValuesDeathTest : public EventValues {
+ protected:
+  // Declares an event that has this key.
+  static void declare(const IoEventKey &key) {
+    const auto port = PortBuilder().set_up();
+    const auto declaration = event_declaration_new();
+    std::string property;
+    populate_event_values(port.get(), {key}, event_declaration_get_inspectable(declaration), false,
+                          &property);
+    event_declaration_free(declaration);
+  }
+};
 
 TEST_F(EventValuesDeathTest, PopulatingADoubleWithAStateIsAProgrammingError) {
-  IoEvent event = named("type");
-  event.keys.push_front(key("k", "PORT_STATUS", "double"));
-  const auto port = PortBuilder().set_up();
-  const auto declaration = event_declaration_new();
-  std::string property;
-  EXPECT_DEATH(
-      populate_event_values(port.get(), event.keys, event_declaration_get_inspectable(declaration),
-                            false, &property),
-      "populate_port_status");
-  event_declaration_free(declaration);
+  EXPECT_DEATH(declare(key("k", "PORT_STATUS", "double")), "populate_port_status");
 }
 
 TEST_F(EventValuesDeathTest, AnUnknownKeyTypeIsAProgrammingError) {
-  IoEvent event = named("type");
-  event.keys.push_front(key("k", "1", "float"));
-  const auto port = PortBuilder().set_up();
-  const auto declaration = event_declaration_new();
-  std::string property;
-  EXPECT_DEATH(
-      populate_event_values(port.get(), event.keys, event_declaration_get_inspectable(declaration),
-                            false, &property),
-      "populate_event_values");
-  event_declaration_free(declaration);
+  EXPECT_DEATH(declare(key("k", "1", "float")), "populate_event_values");
 }
 
 }  // namespace

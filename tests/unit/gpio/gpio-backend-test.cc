@@ -121,13 +121,6 @@ TEST_F(GpioBackendTest, APortThatHasItsLinesIsInService) {
 
 // --- Levels ---
 
-TEST_F(GpioBackendTest, AnInputReadsItsLine) {
-  EXPECT_TRUE(io_port_setup(make_input()));
-  EXPECT_FALSE(io_port_get_state(port()));
-  line("1").value = 1;
-  EXPECT_TRUE(io_port_get_state(port()));
-}
-
 TEST_F(GpioBackendTest, AnyLevelButZeroIsOne) {
   EXPECT_TRUE(io_port_setup(make_input()));
   line("1").value = 4;
@@ -235,22 +228,6 @@ TEST_F(GpioBackendTest, ALineThatDoesNotOpenReadsOneAndIsNotWatched) {
 }
 
 // --- Direction ---
-
-TEST_F(GpioBackendTest, BecomingAnInputTurnsTheOutputOffBeforeTheDriver) {
-  io_port_restore_direction(make_configurable(), false);
-  io_port_restore_activelow(port(), true, false);
-  EXPECT_TRUE(io_port_setup(port()));
-  fake_ugpio().take_calls();
-  EXPECT_TRUE(io_port_set_direction(port(), true));
-  EXPECT_EQ(fake_ugpio().calls, (Calls{"set 2 0", "set 3 0"}));
-}
-
-TEST_F(GpioBackendTest, BecomingAnOutputTurnsTheDriverOnBeforeTheInactiveLevel) {
-  EXPECT_TRUE(io_port_setup(make_configurable()));
-  fake_ugpio().take_calls();
-  EXPECT_TRUE(io_port_set_direction(port(), false));
-  EXPECT_EQ(fake_ugpio().calls, (Calls{"set 3 1", "set 2 0"}));
-}
 
 TEST_F(GpioBackendTest, AnActiveLowPortBecomesAnOutputAtHighLevel) {
   io_port_restore_activelow(make_configurable(), true, false);

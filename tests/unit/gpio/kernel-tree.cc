@@ -5,8 +5,7 @@
 
 #include <cerrno>
 #include <filesystem>
-#include <fstream>
-#include <sstream>
+#include <string>
 
 #include "platform/host/ugpio-host.h"
 
@@ -37,14 +36,17 @@ std::string tree_file(int fd) {
   return path.starts_with(base) ? path.substr(base.size()) : "";
 }
 
+std::string make_root() {
+  std::string path = (fs::temp_directory_path() / "portd-gpio-XXXXXX").string();
+  const std::string root = g_mkdtemp(path.data());
+  // Tests that do without root's rights must still come in.
+  fs::permissions(root, fs::perms(0755));
+  return root;
+}
+
 }  // namespace
 
-KernelTree::KernelTree() {
-  std::string path = (fs::temp_directory_path() / "portd-gpio-XXXXXX").string();
-  root_ = g_mkdtemp(path.data());
-  // Tests that do without root's rights must still come in.
-  fs::permissions(root_, fs::perms(0755));
-  ugpio_host_set_root(root_);
+KernelTree::KernelTree() : GpioTree(make_root()) {
   write_file(std::string(kClass) + "export", "");
   write_file(std::string(kClass) + "unexport", "");
   current = this;
@@ -52,26 +54,8 @@ KernelTree::KernelTree() {
 
 KernelTree::~KernelTree() {
   current = nullptr;
-  ugpio_host_set_root("/sys");
   std::error_code error;
-  fs::remove_all(root_, error);
-}
-
-void KernelTree::make_line(const std::string &number) {
-  for (const auto &[name, text] : attributes) {
-    write_file((fs::path(kClass) / ("gpio" + number) / name).string(), text);
-  }
-}
-
-void KernelTree::write_file(const std::string &path, const std::string &text) const {
-  fs::create_directories(fs::path(full(path)).parent_path());
-  std::ofstream(full(path)) << text;
-}
-
-std::string KernelTree::read_file(const std::string &path) const {
-  std::ostringstream text;
-  text << std::ifstream(full(path)).rdbuf();
-  return text.str();
+  fs::remove_all(full(""), error);
 }
 
 void KernelTree::remove(const std::string &path) const {
@@ -97,7 +81,7 @@ int KernelTree::on_write(const std::string &file, const std::string &text) {
     return error->second;
   }
   if (file == "export" && exports) {
-    make_line(text);
+    make_line(std::stoi(text));
   } else if (file == "unexport") {
     remove(kClass + ("gpio" + text));
   }

@@ -8,16 +8,13 @@
 #include <string>
 #include <vector>
 
-class KernelTree {
+#include "support/gpio-tree.h"
+
+class KernelTree : public GpioTree {
  public:
   KernelTree();
   ~KernelTree();
-  KernelTree(const KernelTree &) = delete;
-  KernelTree &operator=(const KernelTree &) = delete;
 
-  // What a line's files hold when it gets exported, and whether it has them.
-  std::map<std::string, std::string> attributes = {
-      {"direction", "in\n"}, {"edge", "none\n"}, {"active_low", "0\n"}, {"value", "0\n"}};
   bool exports = true;                // a write to `export` makes the line
   std::map<std::string, int> errors;  // by file name: the errno of every write to it
   std::vector<std::string> writes;    // "gpio12/direction high", "export 12", in order
@@ -26,18 +23,10 @@ class KernelTree {
   int reads = 0;                      // of open files at a position
   long slept = 0;                     // microseconds
 
-  void make_line(const std::string &number);
-  void write_file(const std::string &path, const std::string &text) const;
-  std::string read_file(const std::string &path) const;
   void remove(const std::string &path) const;
   void set_mode(const std::string &path, unsigned int mode) const;
   void make_link(const std::string &path, const std::string &target) const;
 
   // The errno of a write to a file of the tree; 0 when it succeeds.
   int on_write(const std::string &file, const std::string &text);
-
- private:
-  std::string full(const std::string &path) const { return root_ + "/" + path; }
-
-  std::string root_;
 };

@@ -60,28 +60,28 @@ TEST_F(UgpioHostTest, AFreedLineIsUnexported) {
 // --- Lines that were exported before ---
 
 TEST_F(UgpioHostTest, ALineExportedBeforeIsUsedAndNotUnexported) {
-  tree.make_line("12");
+  tree.make_line(12);
   request(kOutputHigh).reset();
   EXPECT_EQ(tree.writes, Writes{"gpio12/direction high"});
 }
 
 TEST_F(UgpioHostTest, ALineExportedInTheSameMomentIsUsedAndNotUnexported) {
   tree.errors["export"] = EBUSY;
-  tree.on_export = [this] { tree.make_line("12"); };
+  tree.on_export = [this] { tree.make_line(12); };
   request(kInput).reset();
   EXPECT_EQ(tree.writes, (Writes{"export 12", "gpio12/direction in", "gpio12/edge both"}));
 }
 
 TEST_F(UgpioHostTest, EdgesLeftByAnEarlierUserAreOffBeforeTheLineBecomesAnOutput) {
   tree.attributes["edge"] = "both\n";
-  tree.make_line("12");
+  tree.make_line(12);
   const ContextPtr context = request(kOutputLow);
   EXPECT_EQ(tree.writes, (Writes{"gpio12/edge none", "gpio12/direction low"}));
 }
 
 TEST_F(UgpioHostTest, AnInputWithoutTriggersHasItsEdgesOff) {
   tree.attributes["edge"] = "rising\n";
-  tree.make_line("12");
+  tree.make_line(12);
   const ContextPtr context = request(0x1);
   EXPECT_EQ(tree.writes, (Writes{"gpio12/direction in", "gpio12/edge none"}));
 }
@@ -166,7 +166,7 @@ TEST_F(UgpioHostTest, TheFilesOfAFreshLineAreWaitedFor) {
   tree.exports = false;
   tree.on_sleep = [this] {
     if (tree.slept >= 20'000) {
-      tree.make_line("12");
+      tree.make_line(12);
       tree.on_sleep = nullptr;
     }
   };
@@ -182,7 +182,7 @@ class UgpioLateRightsTest : public UgpioHostTest {
     tree.on_sleep = [this, &withhold] {
       const Privileged owner;
       if (tree.slept == 1'000) {
-        tree.make_line("12");
+        tree.make_line(12);
         withhold();
       } else if (tree.slept == 20'000) {
         set_line_modes(0666);
@@ -221,7 +221,7 @@ TEST_F(UgpioHostTest, ALineThatNeverAppearsIsNotWaitedForLong) {
 
 TEST_F(UgpioHostTest, ALineExportedBeforeIsNotWaitedFor) {
   tree.attributes.erase("direction");
-  tree.make_line("12");
+  tree.make_line(12);
   EXPECT_FALSE(request(kInput));
   EXPECT_EQ(errno, ENOENT);
   EXPECT_EQ(tree.slept, 0);
@@ -286,7 +286,7 @@ TEST_F(UgpioHostTest, AnInputCannotBeDriven) {
 }
 
 TEST_F(UgpioHostTest, AValueThatMayOnlyBeReadIsOpenedForReading) {
-  tree.make_line("12");
+  tree.make_line(12);
   tree.set_mode("class/gpio/gpio12/value", 0444);
   const ContextPtr context = request(kOutputLow);
   const Unprivileged nobody;

@@ -3,13 +3,31 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <unistd.h>
+
+#include <cerrno>
 
 #include "base/glib-ptr.h"
 #include "base/unique-fd.h"
 #include "support/file-size-limit.h"
 #include "support/recording-listener.h"
 #include "support/temp-dir.h"
+
+namespace {
+
+int owner_error = 0;  // an errno: no file changes its owner
+
+}  // namespace
+
+// NOLINTNEXTLINE(readability-inconsistent-declaration-parameter-name): the library's are reserved.
+extern "C" int fchown(int fd, uid_t owner, gid_t group) noexcept {
+  if (owner_error != 0) {
+    errno = owner_error;
+    return -1;
+  }
+  return static_cast<int>(syscall(SYS_fchown, fd, owner, group));
+}
 
 namespace {
 
@@ -77,6 +95,28 @@ TEST(Confutils, KeepsTheOwnerAsFarAsTheCallerMaySetIt) {
   EXPECT_EQ(status.st_uid, may_give_away ? kSomeone : geteuid());
   EXPECT_EQ(status.st_gid, may_give_away ? kSomeGroup : getegid());
   EXPECT_EQ(dir.read("file"), "new");
+}
+
+TEST(Confutils, ReplacesAFileWhoseOwnerItMayNotKeep) {
+  const TempDir dir;
+  const std::string file = dir.write("file", "old");
+  Error error;
+  owner_error = EPERM;
+  EXPECT_TRUE(set_contents(file, "new", error));
+  owner_error = 0;
+  EXPECT_EQ(dir.read("file"), "new");
+}
+
+TEST(Confutils, LeavesTheOldFileWhereItsOwnerCannotBeKeptForAnotherReason) {
+  const TempDir dir;
+  const std::string file = dir.write("file", "old");
+  Error error;
+  owner_error = EIO;
+  EXPECT_FALSE(set_contents(file, "new", error));
+  owner_error = 0;
+  EXPECT_TRUE(error.matches(G_FILE_ERROR, G_FILE_ERROR_IO));
+  EXPECT_EQ(dir.read("file"), "old");
+  EXPECT_EQ(dir.names(), Lines{"file"});
 }
 
 TEST(Confutils, WritesNothingAsAnEmptyFile) {

@@ -415,15 +415,7 @@ TEST_F(IioDeath, AConverterOfAnotherKindEndsTheDaemon) {
 }
 
 TEST_F(IioDeath, TheControlPinsOfAnOutputAreAProgrammingError) {
-  GTEST_FLAG_SET(death_test_style, "threadsafe");
-  const IOPortRef port = make();
-  EXPECT_TRUE(io_port_setup(port.get()));
-  EXPECT_DEATH(
-      {
-        io_port_set_type(port.get(), PORT_OUTPUT);
-        port->functions->set_direction(port.get(), true);
-      },
-      "supervised-iio-backend.*iio_set_control_pins.*port->type == PORT_INPUT");
+  expect_control_pins_die_for_an_output(make(), "supervised-iio-backend.*iio_set_control_pins");
 }
 
 TEST_F(Iio, OnlyTwoKindsOfEntriesAreKnown) {

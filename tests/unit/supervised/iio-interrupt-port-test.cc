@@ -220,15 +220,8 @@ TEST_F(Interrupt, ADroppedPortHoldsNothingAndComesBackAgainAndAgain) {
 }
 
 TEST_F(Interrupt, TheControlPinsOfAnOutputAreAProgrammingError) {
-  GTEST_FLAG_SET(death_test_style, "threadsafe");
-  const IOPortRef port = make();
-  EXPECT_TRUE(io_port_setup(port.get()));
-  EXPECT_DEATH(
-      {
-        io_port_set_type(port.get(), PORT_OUTPUT);
-        port->functions->set_direction(port.get(), true);
-      },
-      "supervised-iio-interrupt-backend.*iio_int_set_control_pins.*port->type == PORT_INPUT");
+  expect_control_pins_die_for_an_output(
+      make(), "supervised-iio-interrupt-backend.*iio_int_set_control_pins");
 }
 
 }  // namespace

@@ -209,7 +209,7 @@ TEST_F(Pins, AnOutputIsJustThat) {
   EXPECT_FALSE(io_port_set_supervised(port.get(), true));
   EXPECT_TRUE(io_port_set_state(port.get(), true));
   EXPECT_FALSE(line(kOutput));
-  EXPECT_TRUE(fake_spidev().calls.empty());
+  EXPECT_TRUE(fake_spidev().calls().empty());
   EXPECT_EQ(control(), "00");
 }
 

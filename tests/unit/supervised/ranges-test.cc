@@ -163,8 +163,7 @@ class Poll : public Ranges {
   }
 
   static void set_level(unsigned int level) {
-    fake_spidev().received[0] = static_cast<std::uint8_t>(level >> 4);
-    fake_spidev().received[1] = static_cast<std::uint8_t>(level << 4);
+    fake_spidev().answer_sample(static_cast<int>(level));
   }
 
   void supervise() {
@@ -232,7 +231,7 @@ TEST_F(Poll, AFailedReadoutIsLoggedAndTheTimerStays) {
   expire(kPoll);
   reports();
   logged();
-  fake_spidev().transfer_error = EIO;
+  fake_spidev().error = EIO;
   expire(kPoll);
   EXPECT_TRUE(was_logged("critical: Readout failed: Input/output error"));
   EXPECT_EQ(timers().size(), 1U);

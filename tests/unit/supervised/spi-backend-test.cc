@@ -30,17 +30,6 @@ class Spi : public Bench {
     return make_port(BACKEND_SPI, PORT_INPUT, properties);
   }
 
-  // The state and level of a readout, or its error.
-  static std::string readout(const IOPortRef &port) {
-    SupervisedRangeState state = SUPERVISED_STATE_OPEN;
-    std::uint32_t level = 0;
-    Error error;
-    if (io_port_get_supervised_readout(port.get(), &state, &level, error.out())) {
-      return std::string(supervised_range_state2string(state)) + " " + std::to_string(level);
-    }
-    return "error " + std::to_string(error.get()->code) + ": " + error.message();
-  }
-
   // Descriptors of the process that lead to the converter.
   std::size_t open_devices() const {
     std::size_t count = 0;
@@ -56,10 +45,10 @@ class Spi : public Bench {
 
 TEST_F(Spi, WithoutASpeedOnlyTheWordSizeIsSet) {
   EXPECT_TRUE(io_port_setup(make().get()));
-  EXPECT_EQ(fake_spidev().calls, (Words{"bits 8"}));
+  EXPECT_EQ(fake_spidev().calls(), (Words{"bits 8"}));
   fake_spidev() = {};
   EXPECT_TRUE(io_port_setup(make({{"speed", "value", "0"}}).get()));
-  EXPECT_EQ(fake_spidev().calls, (Words{"bits 8"}));
+  EXPECT_EQ(fake_spidev().calls(), (Words{"bits 8"}));
 }
 
 TEST_F(Spi, ASpeedMayBeDecimalHexadecimalOrOctal) {
@@ -67,7 +56,7 @@ TEST_F(Spi, ASpeedMayBeDecimalHexadecimalOrOctal) {
                                    std::pair{"0x10", "speed 16"}, std::pair{"010", "speed 8"}}) {
     fake_spidev() = {};
     EXPECT_TRUE(io_port_setup(make({{"speed", "value", text}}).get()));
-    EXPECT_EQ(fake_spidev().calls, (Words{"bits 8", call}));
+    EXPECT_EQ(fake_spidev().calls(), (Words{"bits 8", call}));
   }
 }
 
@@ -78,10 +67,10 @@ TEST_F(Spi, AReadoutSendsTheAddressAndReadsTwelveBits) {
                                {"range", "upper", "2749"}});
   EXPECT_TRUE(io_port_setup(port.get()));
   fake_spidev() = {};
-  fake_spidev().received[0] = 0xAB;
-  fake_spidev().received[1] = 0xCD;
+  fake_spidev().answer[0] = 0xAB;
+  fake_spidev().answer[1] = 0xCD;
   EXPECT_EQ(readout(port), "cut 2748");
-  EXPECT_EQ(fake_spidev().calls, (Words{"send 1f 0, receive 2"}));
+  EXPECT_EQ(fake_spidev().calls(), (Words{"send 1f 0, receive 2"}));
 }
 
 TEST_F(Spi, AnAddressMayHaveAnyKey) {
@@ -89,17 +78,17 @@ TEST_F(Spi, AnAddressMayHaveAnyKey) {
   EXPECT_TRUE(io_port_setup(port.get()));
   fake_spidev() = {};
   EXPECT_EQ(readout(port), "undefined 0");
-  EXPECT_EQ(fake_spidev().calls, (Words{"send 2a 0, receive 2"}));
+  EXPECT_EQ(fake_spidev().calls(), (Words{"send 2a 0, receive 2"}));
 }
 
 TEST_F(Spi, OneFailedTransferCostsTheDevice) {
   const IOPortRef port = make();
   EXPECT_TRUE(io_port_setup(port.get()));
-  fake_spidev().transfer_error = EIO;
+  fake_spidev().error = EIO;
   EXPECT_EQ(readout(port), "error 0: Input/output error");
   EXPECT_TRUE(was_logged("critical: Error: Input/output error"));
   EXPECT_EQ(open_devices(), 0U);
-  fake_spidev().transfer_error = 0;
+  fake_spidev().error = 0;
   EXPECT_EQ(readout(port), "error 0: Bad file descriptor");
   EXPECT_EQ(io_port_get_supervised_state(port.get()), SUPERVISED_STATE_UNDEFINED);
   EXPECT_TRUE(io_port_setup(port.get()));
@@ -162,7 +151,7 @@ TEST_F(Spi, ADroppedPortClosesItsDeviceAndComesBackAgainAndAgain) {
       make({{"range", "state", "open"}, {"range", "lower", "1"}, {"range", "upper", "9"}});
   EXPECT_TRUE(io_port_set_supervised_range(port.get(), "open", 20, 30, nullptr));
   io_port_restore_supervised(port.get(), true);
-  fake_spidev().received[1] = 0x80;
+  fake_spidev().answer[1] = 0x80;
   for (int round = 0; round < 50; ++round) {
     ASSERT_TRUE(io_port_setup(port.get()));
     ASSERT_EQ(open_devices(), 1U);
@@ -177,21 +166,7 @@ TEST_F(Spi, ADroppedPortClosesItsDeviceAndComesBackAgainAndAgain) {
 }
 
 TEST_F(Spi, TheControlPinsOfAnOutputAreAProgrammingError) {
-  GTEST_FLAG_SET(death_test_style, "threadsafe");
-  const IOPortRef port = make_port(BACKEND_SPI, PORT_CONFIGURABLE,
-                                   {{"input", "pin", "1"},
-                                    {"output", "pin", "4"},
-                                    {"io_ctrl", "pin", "2"},
-                                    {"sio_ctrl", "pin", "3"},
-                                    {"device", "path", path("spidev")}});
-  EXPECT_TRUE(io_port_setup(port.get()));
-  EXPECT_DEATH(
-      {
-        io_port_set_supervised(port.get(), true);
-        io_port_set_type(port.get(), PORT_OUTPUT);
-        port->functions->set_direction(port.get(), true);
-      },
-      "spi_set_control_pins.*port->type == PORT_INPUT");
+  expect_control_pins_die_for_an_output(make(), "supervised-spi-backend.*spi_set_control_pins");
 }
 
 }  // namespace

@@ -12,8 +12,9 @@
 #include <sstream>
 #include <utility>
 
+#include "base/glib-ptr.h"
 #include "daemon/backends.h"
-#include "platform/host/ugpio-host.h"
+#include "port/ioport-private.h"
 #include "port/port-listener.h"
 
 namespace {
@@ -46,6 +47,12 @@ bool is_broken(int fd, const std::vector<std::string> &broken) {
 template <typename Function>
 Function *real_call(const char *name) {
   return reinterpret_cast<Function *>(dlsym(RTLD_NEXT, name));
+}
+
+std::string make_folder() {
+  std::string folder = testing::TempDir() + "portd-bench-XXXXXX";
+  g_assert(mkdtemp(folder.data()));
+  return folder;
 }
 
 bool armed(const Timer &timer) {
@@ -133,11 +140,7 @@ extern "C" gboolean g_file_get_contents(const gchar *filename, gchar **contents,
 
 extern "C" void g_usleep(gulong /*microseconds*/) {}
 
-Bench::Bench() {
-  root_ = testing::TempDir() + "portd-bench-XXXXXX";
-  g_assert(mkdtemp(root_.data()));
-  std::filesystem::create_directories(path("class/gpio"));
-  ugpio_host_set_root(root_);
+Bench::Bench() : root_(make_folder()), lines_(root_) {
   g_log_set_default_handler(on_log, nullptr);
   all_reports.clear();
   all_logged.clear();
@@ -184,11 +187,7 @@ void Bench::texts_to_come(const std::vector<std::string> &texts) {
 }
 
 void Bench::make_line(int number) const {
-  const std::string folder = "class/gpio/gpio" + std::to_string(number) + "/";
-  write(folder + "direction", "in\n");
-  write(folder + "edge", "none\n");
-  write(folder + "active_low", "0\n");
-  write(folder + "value", "0\n");
+  lines_.make_line(number);
 }
 
 void Bench::set_line(int number, bool level) const {
@@ -200,7 +199,7 @@ bool Bench::line(int number) const {
 }
 
 void Bench::break_line(int number) const {
-  broken_files.push_back(path("class/gpio/gpio" + std::to_string(number) + "/value"));
+  broken_files.push_back(lines_.line_path(number, "value"));
 }
 
 void Bench::break_reads(std::string_view name) const {
@@ -238,6 +237,27 @@ SupervisedRanges Bench::ranges_of(const IOPortRef &port) {
   SupervisedRanges ranges;
   EXPECT_TRUE(io_port_get_supervised_ranges(port.get(), &ranges));
   return ranges;
+}
+
+std::string Bench::readout(const IOPortRef &port) {
+  SupervisedRangeState state = SUPERVISED_STATE_OPEN;
+  std::uint32_t level = 0;
+  Error error;
+  if (io_port_get_supervised_readout(port.get(), &state, &level, error.out())) {
+    return std::string(supervised_range_state2string(state)) + " " + std::to_string(level);
+  }
+  return "error " + std::to_string(error.get()->code) + ": " + error.message();
+}
+
+void Bench::expect_control_pins_die_for_an_output(const IOPortRef &port, const char *place) {
+  GTEST_FLAG_SET(death_test_style, "threadsafe");
+  EXPECT_TRUE(io_port_setup(port.get()));
+  EXPECT_DEATH(
+      {
+        io_port_set_type(port.get(), PORT_OUTPUT);
+        port->functions->set_direction(port.get(), true);
+      },
+      std::string(place) + ".*port->type == PORT_INPUT");
 }
 
 std::vector<std::string> Bench::reports() {

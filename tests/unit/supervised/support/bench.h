@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "port/ioport.h"
+#include "support/gpio-tree.h"
 
 // One attribute of the hardware description.
 struct Property {
@@ -54,6 +55,10 @@ class Bench : public testing::Test {
   // Gives the port an event that tells the state of its line while it is supervised.
   static void add_supervised_event(const IOPortRef &port);
   static SupervisedRanges ranges_of(const IOPortRef &port);
+  // "closed 150", or "error CODE: MESSAGE".
+  static std::string readout(const IOPortRef &port);
+  // Control pins are those of an input: driving them for an output dies with that place.
+  static void expect_control_pins_die_for_an_output(const IOPortRef &port, const char *place);
 
   // --- Reports: "1 on" for PortChanged of port 1, "event cut" for an event ---
   static std::vector<std::string> reports();
@@ -75,4 +80,7 @@ class Bench : public testing::Test {
   static void expire_all();
 
   std::string root_;
+
+ private:
+  GpioTree lines_;
 };

@@ -111,16 +111,6 @@ int IioBench::open_events(int number) const {
   return open(path(node(number) + ".events").c_str(), O_RDWR | O_NONBLOCK | O_CLOEXEC);
 }
 
-std::string IioBench::readout(const IOPortRef &port) {
-  SupervisedRangeState state = SUPERVISED_STATE_OPEN;
-  std::uint32_t level = 0;
-  Error error;
-  if (io_port_get_supervised_readout(port.get(), &state, &level, error.out())) {
-    return std::string(supervised_range_state2string(state)) + " " + std::to_string(level);
-  }
-  return "error " + std::to_string(error.get()->code) + ": " + error.message();
-}
-
 std::size_t IioBench::descriptors(const std::string &name) const {
   const auto files = open_files();
   return static_cast<std::size_t>(std::count(files.begin(), files.end(), path(name)));

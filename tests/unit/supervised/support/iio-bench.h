@@ -26,8 +26,6 @@ class IioBench : public Bench {
   void make_events(int number) const;
   int open_events(int number) const;
 
-  // The state and level of a readout, or its error.
-  static std::string readout(const IOPortRef &port);
   // Descriptors of the process that lead to a file of the bench.
   std::size_t descriptors(const std::string &name) const;
   std::size_t descriptors() const;
