@@ -14,6 +14,7 @@
 #include <string_view>
 
 #include "base/glib-ptr.h"
+#include "base/heap.h"
 #include "base/log.h"
 #include "base/main-queue.h"
 #include "base/source.h"
@@ -44,6 +45,7 @@ namespace {
 
 // A little less than what the daemon has to end.
 constexpr std::int64_t kStorageTimeoutUs = 4'000'000;
+constexpr guint kStartSeconds = 1;
 
 struct Daemon {
   GMainLoopPtr loop;
@@ -186,6 +188,11 @@ void start_manual_triggers() {
   manual_trigger_start();
 }
 
+gboolean on_started(gpointer /*user_data*/) {
+  heap_trim();
+  return G_SOURCE_REMOVE;
+}
+
 // From here on as the service account.
 void start_services() {
   io_events_start();
@@ -199,6 +206,8 @@ void start_services() {
   port_registry_declare_events();
   port_registry_log_service();
   start_manual_triggers();
+  // When the documents are forgotten and the events have left for the bus.
+  g_timeout_add_seconds(kStartSeconds, on_started, nullptr);
 }
 
 // What storage has not taken by then is lost.

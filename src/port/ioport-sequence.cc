@@ -3,12 +3,11 @@
 // A sequence counts as running from before its thread starts until after its end was announced, so
 // that there is no moment at which a cancel could be lost. The thread gives up the port's lock for
 // each wait and waits on the sequence lock, under which a cancel is asked for: no wake-up is lost.
-#include <malloc.h>
-
 #include <algorithm>
 
 #include "base/assert.h"
 #include "base/glib-ptr.h"
+#include "base/heap.h"
 #include "base/log.h"
 #include "port/ioport-private.h"
 #include "port/port-listener.h"
@@ -128,15 +127,11 @@ void run_steps(const ActionJob &job) {
 }
 
 // The allocator would keep the memory of a long sequence and of the message that it came with.
-void trim_heap(std::size_t steps) {
-#ifdef __GLIBC__
+void trim_heap_after(std::size_t steps) {
   constexpr std::size_t many = 1024;
   if (steps > many) {
-    malloc_trim(0);
+    heap_trim();
   }
-#else
-  (void)steps;
-#endif
 }
 
 gpointer run_sequence(gpointer data) {
@@ -148,7 +143,7 @@ gpointer run_sequence(gpointer data) {
     announce_end(job->port.get());
     release(job->port.get());
   }
-  trim_heap(steps);
+  trim_heap_after(steps);
   thread_ended();
   return nullptr;
 }

@@ -9,6 +9,7 @@
 #include <memory>
 #include <sstream>
 
+#include "support/device-manager.h"
 #include "support/mock-iio.h"
 #include "support/mock-spi.h"
 #include "support/rights.h"
@@ -212,6 +213,27 @@ TEST_F(Privileges, WithRightsFromTheDeviceManagerARefreshWorks) {
   MockIio::set_value(kSampled, kClosed);
   EXPECT_EQ(client_.refresh(), "");
   expect_inputs_work(kClosed, "closed");
+}
+
+TEST_F(Privileges, TheInstalledRulesAreEnoughForARefresh) {
+  const DeviceManager manager;
+  start_all();
+  DeviceManager::settle();
+  drop_all();
+  MockIio::set_value(kSampled, kClosed);
+  EXPECT_EQ(client_.refresh(), "");
+  expect_inputs_work(kClosed, "closed");
+}
+
+TEST_F(Privileges, TheInstalledRulesAreEnoughForAnOutputThatIsRefreshed) {
+  const DeviceManager manager;
+  start(port_element("out", 0, "output", "gpio",
+                     "<output pin='" + plain_.number_text(PLAIN_OUT) + "'/>", true));
+  DeviceManager::settle();
+  EXPECT_EQ(client_.drop("out"), std::vector<std::string>{"out"});
+  EXPECT_EQ(client_.refresh(), "");
+  EXPECT_EQ(client_.set_state(0, true), "");
+  EXPECT_TRUE(plain_.level(PLAIN_OUT));
 }
 
 }  // namespace

@@ -3,6 +3,7 @@
 
 #include <memory>
 
+#include "support/device-manager.h"
 #include "support/mock-iio.h"
 #include "support/rights.h"
 #include "support/supervised-test.h"
@@ -341,6 +342,21 @@ TEST_F(ThresholdsOfTheKernel, AConverterThatIsBackIsUsedAsSoonAsTheAccountMay) {
     EXPECT_TRUE(reads(channel, "cut", kCut));
   }
   EXPECT_EQ(Daemon::log_count("mock-adc0 is back, but "), 2);  // once for each port
+}
+
+TEST_F(ThresholdsOfTheKernel, TheInstalledRulesAreEnoughForAConverterThatComesBack) {
+  const DeviceManager manager;
+  plug_in();
+  start(port(0, 0) + port(1, 1));
+  supervise_all(2);
+  MockIio::unplug();
+  EXPECT_TRUE(wait_until([] { return Daemon::logged("read Error: "); }));
+  MockIio::plug();
+  for (const int channel : {0, 1}) {
+    EXPECT_TRUE(becomes_enabled(channel, {1, 1})) << channel;
+    MockIio::set_value(channel, kCut);
+    EXPECT_TRUE(reads(channel, "cut", kCut));
+  }
 }
 
 }  // namespace
