@@ -191,7 +191,8 @@ class Bench:
             device = self.device(checked_outputs(10))
             counted = device.write("/run/callgrind", "")
             counted.chmod(0o666)  # the daemon gives its rights up
-            process = start(device, ("valgrind", "--tool=callgrind", "--callgrind-out-file=/run/callgrind"))
+            tool = ("valgrind", "--tool=callgrind", "--callgrind-out-file=/run/callgrind")
+            process = start(device, tool)
             device.measure(call, method, "(uint32 1,)", count)
             if process is device:
                 device.stop()

@@ -39,11 +39,13 @@ shared_folder() {
 # share FOLDER ENTRY: moves the folder there, in one step. Who comes second has made the same.
 share() { mv -T "$1" "$2" 2>/dev/null || rm -rf "$1"; }
 
-# Keeps those three states that were used last, and no halves that an interrupted run has left.
+# Keeps those three states that were used last, and no halves that an interrupted run has left. What
+# another clone moves away meanwhile is no matter.
 prune_shared() {
   local entry
-  find "$1" -maxdepth 1 -name '.new-*' -mmin +300 -exec rm -rf {} +
-  find "$1" -maxdepth 1 -name "$2-*" -printf '%T@ %p\n' | sort -rn | tail -n +4 | cut -d' ' -f2- |
+  find "$1" -maxdepth 1 -name '.new-*' -mmin +300 -exec rm -rf {} + 2>/dev/null || true
+  { find "$1" -maxdepth 1 -name "$2-*" -printf '%T@ %p\n' 2>/dev/null || true; } |
+    sort -rn | tail -n +4 | cut -d' ' -f2- |
     while IFS= read -r entry; do rm -rf "$entry"; done
 }
 

@@ -79,7 +79,7 @@ def test_the_worked_examples_pass_and_the_daemon_makes_a_port_of_each(device: De
     assert {name for name in made if not name.startswith("manualtrigger")} == set(backends)
 
 
-HINT = '"portctl check" tells what'
+HINT = '"portctl check" lists them'
 
 
 @pytest.mark.parametrize("name", ["nr for nbr", "port-type", "Port", "an unclosed tag"])
