@@ -85,14 +85,16 @@ gboolean set_supervised(IOSupervisedSupervised *object, GDBusMethodInvocation *i
       if (!io_port_set_supervised(port, supervised)) {
         return fail(invocation, IO_SUPERVISED_ERROR_NOT_SUPERVISABLE, kNotSupervisable);
       }
-      // The setting is stored before the caller is answered.
-      io_port_ref(port);
-      const std::shared_ptr<IOPort> kept(port, io_port_unref);
-      io_port_when_idle(port, [kept, object, invocation] {
-        param_request_save(kept.get(), kSettingsFile, [object, invocation] {
+      // Whoever is answered finds the setting stored and the port idle. The setting is taken now: a
+      // port that is dropped meanwhile has none.
+      const auto left = std::make_shared<int>(2);
+      const auto one_done = [left, object, invocation] {
+        if (--*left == 0) {
           iosupervised_supervised_complete_set_supervised(object, invocation);
-        });
-      });
+        }
+      };
+      param_request_save(port, kSettingsFile, one_done);
+      io_port_when_idle(port, one_done);
       // Which of the port's events apply depends on whether it is supervised.
       io_port_redeclare_events(port);
       return;

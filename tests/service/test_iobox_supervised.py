@@ -2,7 +2,9 @@
 
 import pytest
 
-from converters import expect_supervised_error, readout, supervise, supervised
+from converters import (
+    SUPERVISED, SUPERVISED_PATH, expect_supervised_error, readout, supervise, supervised,
+)  # fmt: skip
 from harness import Device, hwdesc, port, wait_for
 from neighbours import IoBox, neighbourhood_fixture
 from producer import Producer
@@ -120,3 +122,21 @@ def test_an_invalid_range_changes_nothing(device, box):
             "SetSupervisedRanges", "usuu", INPUT, state, lower, upper,
         )  # fmt: skip
     assert supervised(device, "GetSupervisedRanges", "u", INPUT) == [("cut", 10, 20)]
+
+
+def test_supervision_is_stored_though_the_port_is_dropped_before_the_box_answers(
+    make_device, neighbourhood
+):
+    device = make_device()
+    device.conf(hwdesc(port("loop", INPUT, backend="iobox", optional=True)))
+    box = IoBox(neighbourhood, device)
+    device.start()
+    device.wait_name(SUPERVISED)
+    box.service.hang()
+    asked = device.bus.begin_call(
+        SUPERVISED, SUPERVISED_PATH, SUPERVISED, "SetSupervised", "ub", INPUT, True
+    )
+    assert device.call("DropIOPorts", "as", ["loop"]) == ["loop"]
+    box.service.resume()
+    asked.result()
+    assert "supervised_input=true" in device.read_settings()
