@@ -6,9 +6,9 @@
 
 #include <csignal>
 #include <string_view>
-#include <thread>
 
 #include "base/glib-ptr.h"
+#include "base/log.h"
 
 namespace {
 
@@ -36,10 +36,10 @@ gboolean on_sigterm(gpointer user_data) {
   return G_SOURCE_REMOVE;
 }
 
-void watch(GMainContext *context) {
-  const MainContextPtr owned(context);
+gpointer watch(gpointer context) {
+  const MainContextPtr owned(static_cast<GMainContext *>(context));
   while (true) {
-    g_main_context_iteration(context, TRUE);
+    g_main_context_iteration(owned.get(), TRUE);
   }
 }
 
@@ -51,10 +51,17 @@ GCancellable *termination_cancellable() {
   return cancellable;
 }
 
-void termination_watch() {
+bool termination_watch() {
   GMainContext *context = g_main_context_new();
   const SourcePtr sigterm(g_unix_signal_source_new(SIGTERM));
   g_source_set_callback(sigterm.get(), on_sigterm, context, nullptr);
   g_source_attach(sigterm.get(), context);
-  std::thread(watch, context).detach();
+  Error error;
+  GThread *thread = g_thread_try_new("Termination", watch, context, error.out());
+  if (!thread) {
+    log_critical("Could not start the thread that waits for SIGTERM: %s", error.message());
+    return false;
+  }
+  g_thread_unref(thread);
+  return true;
 }

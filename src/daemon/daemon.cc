@@ -96,12 +96,12 @@ void raise_descriptor_limit() {
   }
 }
 
-void install_signal_sources(Daemon &daemon) {
+bool install_signal_sources(Daemon &daemon) {
   // A log reader or a client that goes away must not take the daemon along.
   (void)std::signal(SIGPIPE, SIG_IGN);
   daemon.sigterm = Source(g_unix_signal_add(SIGTERM, on_sigterm, &daemon));
   daemon.sighup = Source(g_unix_signal_add(SIGHUP, on_sighup, nullptr));
-  termination_watch();
+  return termination_watch();
 }
 
 void load_hardware_description() {
@@ -249,7 +249,9 @@ int daemon_run(int argc, char **argv) {
   raise_descriptor_limit();
   Daemon daemon;
   daemon.loop.reset(g_main_loop_new(nullptr, FALSE));
-  install_signal_sources(daemon);
+  if (!install_signal_sources(daemon)) {
+    return 1;
+  }
   if (!set_up_ports()) {
     port_registry_drop_all();
     return 1;
