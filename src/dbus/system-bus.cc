@@ -6,6 +6,7 @@
 #include "base/glib-ptr.h"
 #include "base/log.h"
 #include "base/source.h"
+#include "base/termination.h"
 
 namespace {
 
@@ -64,7 +65,8 @@ void on_bus(GObject * /*source*/, GAsyncResult *result, gpointer /*user_data*/) 
 
 void connect_to_bus() {
   if (!std::exchange(system_bus().connecting, true)) {
-    g_bus_get(G_BUS_TYPE_SYSTEM, nullptr, on_bus, nullptr);
+    // Whoever else asks for the connection waits for this one, and a bus may answer nothing.
+    g_bus_get(G_BUS_TYPE_SYSTEM, termination_cancellable(), on_bus, nullptr);
   }
 }
 
