@@ -77,7 +77,7 @@ class BenchDevice(Device):
         return process
 
     def client(self, call: tuple[str, str, str], method: str, arguments: str, count: int,
-               in_flight: int = 1, pause_us: int = 0) -> subprocess.Popen:  # fmt: skip
+               in_flight: int | str = 1, pause_us: int = 0) -> subprocess.Popen:  # fmt: skip
         socket = f"/proc/{self.sandbox.pid}/root{SOCKET}"
         words = [socket, *call, method, arguments, str(count), str(in_flight), str(pause_us)]
         return subprocess.Popen([str(self.build / "bench/bus-client"), *words],
@@ -160,6 +160,33 @@ class Bench:
                   detail=f"{statistics.median(flips):.0f} us")  # fmt: skip
         yield Row("GetState, 64 in flight", "its throughput", ratio_of(get_64), 0.95, at_least=True)
         yield Row("SetState until the reply", "an empty method", ratio_of(set_), 1.4)
+
+    def flood(self) -> Iterable[Row]:
+        """What a client that reads waits while another one sends states and wants no answers."""
+        device = self.device(checked_outputs(10))
+        device.start()
+        bare = device.start_bare("--discard")
+        pairs = []
+        for _ in range(self._rounds):
+            thrown_away = self.longest_wait(device, (BARE_CALL, "Swallow"), (BARE_CALL, "Empty"))
+            served = self.longest_wait(device, (CONTROL_CALL, "SetState"), (CONTROL_CALL, "GetState"))
+            pairs.append((served, thrown_away))
+        bare.terminate()
+        device.close()
+        yield Row("longest GetState beside 100,000 SetState", "a service that discards", ratio_of(pairs),
+                  1.5, detail=f"{statistics.median(mine for mine, _ in pairs):.0f} ms")  # fmt: skip
+
+    def longest_wait(self, device: BenchDevice, flooded: tuple, asked: tuple) -> float:
+        """Milliseconds that the longest call of `asked` takes while `flooded` is called."""
+        reader = device.client(*asked, "(uint32 1,)", 1_000_000, 1, 1000)
+        time.sleep(0.2)  # until it asks
+        finish(device.client(*flooded, "(uint32 2, true)", 100_000, "none"))
+        device.measure(*asked, "(uint32 1,)", 1)
+        time.sleep(0.2)
+        assert reader.stdin is not None
+        reader.stdin.close()
+        reader.stdin = None
+        return finish(reader)["max_us"] / 1000
 
     def many_ports(self) -> Iterable[Row]:
         few, many = self.device(outputs(10)), self.device(outputs(1000))
@@ -425,9 +452,9 @@ class Bench:
                   unit="KiB")  # fmt: skip
 
     def rows(self) -> list[Callable[[], Iterable[Row]]]:
-        return [self.calls, self.many_ports, self.instructions, self.set_states, self.saves, self.storm_of_names,
-                self.polls, self.names_at_once, self.starts, self.start_per_port, self.memory,
-                self.idle, self.steps, self.size]  # fmt: skip
+        return [self.calls, self.flood, self.many_ports, self.instructions, self.set_states,
+                self.saves, self.storm_of_names, self.polls, self.names_at_once, self.starts,
+                self.start_per_port, self.memory, self.idle, self.steps, self.size]  # fmt: skip
 
 
 def replace_file(path: Path, text: str) -> float:

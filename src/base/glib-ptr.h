@@ -33,6 +33,7 @@ using GObjectPtr = std::unique_ptr<T, GlibDeleter<g_object_unref>>;
 class Error {
  public:
   Error() = default;
+  explicit Error(GError *error) : error_(error) {}
   Error(const Error &) = delete;
   Error &operator=(const Error &) = delete;
   ~Error() { g_clear_error(&error_); }

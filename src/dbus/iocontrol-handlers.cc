@@ -54,16 +54,6 @@ gboolean get_state(IOControlState *object, GDBusMethodInvocation *invocation, gu
   });
 }
 
-gboolean set_state(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
-                   gboolean active, gpointer /*user_data*/) {
-  return with_port(invocation, number, [&](IOPort *port) {
-    if (!io_port_set_state(port, active)) {
-      return fail(invocation, IO_CONTROL_ERROR_NOT_OUTPUT, "Port not output.");
-    }
-    answer_and_save(port, [=] { iocontrol_state_complete_set_state(object, invocation); });
-  });
-}
-
 gboolean is_configurable(IOControlState *object, GDBusMethodInvocation *invocation, guint number,
                          gpointer /*user_data*/) {
   return with_port(invocation, number, [&](IOPort *port) {
@@ -284,7 +274,6 @@ gboolean refresh_io_ports(IOControlState *object, GDBusMethodInvocation *invocat
 void iocontrol_connect_handlers(IOControlState *object) {
   connect_handlers(object, {
                                {"handle-get-state", G_CALLBACK(get_state)},
-                               {"handle-set-state", G_CALLBACK(set_state)},
                                {"handle-is-configurable", G_CALLBACK(is_configurable)},
                                {"handle-get-direction", G_CALLBACK(get_direction)},
                                {"handle-set-direction", G_CALLBACK(set_direction)},

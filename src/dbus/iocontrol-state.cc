@@ -4,12 +4,17 @@
 #include "dbus/bus-service.h"
 #include "dbus/error-domain.h"
 #include "dbus/iocontrol-handlers.h"
+#include "dbus/state-calls.h"
+#include "dbus/system-bus.h"
 #include "iocontrol-state-gen.h"
 #include "port/port-listener.h"
 
 namespace {
 
-BusService service("com.kelv.IOControl.State", "/com/kelv/IOControl/State");
+constexpr const char *kName = "com.kelv.IOControl.State";
+constexpr const char *kPath = "/com/kelv/IOControl/State";
+
+BusService service(kName, kPath);
 
 void emit_port_changed(const PortChange &change) {
   service.with_object([&](GDBusInterfaceSkeleton *object) {
@@ -59,9 +64,12 @@ void iocontrol_state_start() {
   port_listener().wait_until_sent = wait_until_sent;
   IOControlState *object = iocontrol_state_skeleton_new();
   iocontrol_connect_handlers(object);
+  system_bus_when_ready(
+      [](GDBusConnection *connection) { state_calls_start(connection, kPath, kName); });
   service.start(G_DBUS_INTERFACE_SKELETON(object));
 }
 
 void iocontrol_state_stop() {
+  state_calls_stop();
   service.stop();
 }
