@@ -103,6 +103,17 @@ TEST_F(SpiAdcBackendTest, TheIntervalIsTheTimeout) {
   EXPECT_EQ(seams().intervals, std::vector<guint>{50});
 }
 
+TEST_F(SpiAdcBackendTest, AnIntervalThatIsNoneIsTenMillisecondsWithAWarning) {
+  for (const char *timeout : {"soon", "", "0"}) {
+    seams() = {};
+    run({{"device", "timeout", timeout}});
+    EXPECT_EQ(seams().intervals, std::vector<guint>{10});
+    EXPECT_EQ(log.take_warnings(),
+              std::vector<std::string>{
+                  "Port terminal: no valid polling interval is given: polling every 10 ms"});
+  }
+}
+
 TEST_F(SpiAdcBackendTest, AnInactiveInputBecomesActiveInsideTheNarrowedRange) {
   run_usual_range();
   EXPECT_FALSE(after(1049));
@@ -275,10 +286,12 @@ TEST_F(SpiAdcBackendTest, AnOutputCannotBeSetUp) {
       log.take_all(G_LOG_LEVEL_WARNING, "Port terminal: an SPI ADC port can only be an input"), 2U);
 }
 
-TEST_F(SpiAdcBackendTest, ARepeatedAnnouncementReplacesTheTimer) {
+// Arming it anew would put its next sample off.
+TEST_F(SpiAdcBackendTest, ARepeatedAnnouncementLeavesTheTimerThatRuns) {
   run_usual_range();
   io_port_set_watch(port());
   io_port_set_watch(port());
+  EXPECT_EQ(seams().intervals, std::vector<guint>{50});
   EXPECT_TRUE(sample_once());
   EXPECT_EQ(fake_spidev().messages.size(), 1U);
 }
