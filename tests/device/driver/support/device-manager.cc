@@ -2,6 +2,7 @@
 
 #include <gtest/gtest.h>
 #include <spawn.h>
+#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -35,6 +36,12 @@ void expect_done(const std::vector<std::string> &words) {
   EXPECT_EQ(status, 0) << words[1];
 }
 
+// What the kernel does not make anew for the next test.
+void take_back(const char *path, mode_t mode) {
+  EXPECT_EQ(chown(path, 0, 0), 0) << path;
+  EXPECT_EQ(chmod(path, mode), 0) << path;
+}
+
 }  // namespace
 
 DeviceManager::DeviceManager() : pid_(run({"/usr/lib/systemd/systemd-udevd"})) {
@@ -46,6 +53,11 @@ DeviceManager::DeviceManager() : pid_(run({"/usr/lib/systemd/systemd-udevd"})) {
 DeviceManager::~DeviceManager() {
   kill(pid_, SIGTERM);
   waitpid(pid_, nullptr, 0);
+  constexpr mode_t attribute = 0200;
+  constexpr mode_t folder = 0755;
+  take_back("/sys/class/gpio/export", attribute);
+  take_back("/sys/class/gpio/unexport", attribute);
+  take_back("/sys/kernel/config/iio/triggers/hrtimer", folder);
 }
 
 void DeviceManager::settle() {

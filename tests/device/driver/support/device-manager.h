@@ -7,6 +7,7 @@ class DeviceManager {
  public:
   // Starts it, and has it go over the devices that are there already.
   DeviceManager();
+  // Takes back what the rules have granted on files that outlive the devices of a test.
   ~DeviceManager();
   DeviceManager(const DeviceManager &) = delete;
   DeviceManager &operator=(const DeviceManager &) = delete;
