@@ -37,6 +37,9 @@ class Any_:
     def __eq__(self, _other: object) -> bool:
         return True
 
+    def __ne__(self, _other: object) -> bool:
+        return False
+
     def __repr__(self) -> str:
         return "any"
 
@@ -133,9 +136,10 @@ class Port:
         return None if self.is_input is None else self.low_in if self.is_input else self.low_out
 
     def expect(self, trig: bool, state: Optional[bool], must: bool = True) -> None:
-        """One signal PortChanged is to come."""
+        """One signal PortChanged is to come, or may where a sequence may have its turn first."""
         self.touched += 1
-        if not self.follows_world and not self.loose:
+        if not self.follows_world:
+            must = must and not self.loose
             fields = (self.number, "virtual" in self.flags, "hidden" in self.flags,
                       _or_any(self.is_input), trig, _or_any(state), _or_any(self.low))  # fmt: skip
             self.expected.append((fields, must, self.serving))
@@ -149,10 +153,10 @@ class Port:
         if old is None or now is None or old != now:
             self.expect(False, now, must=None not in (old, now))
 
-    def turn(self, to_input: bool) -> None:
+    def turn(self, to_input: bool, must: bool = True) -> None:
         self.is_input = to_input
         self.touched += 1
-        self.expect(False, self.state)
+        self.expect(False, self.state, must)
 
     def set_low(self, low: bool, of_input: bool) -> None:
         if of_input:
@@ -234,6 +238,8 @@ class Model:
             if member == "StartActionSequence" and answer.may_succeed:
                 port.starts -= 1
                 port.running += error is None
+                # What was asked for since the sequence ended counted on nothing either.
+                port.ending |= self._open_calls(port)
             port.ending.discard(key)
             self._expire(port, key)
 
@@ -267,11 +273,20 @@ class Model:
         while port.expected:
             wanted, must, _key = port.expected.popleft()
             if wanted == fields:
+                if not must:
+                    self._weaken(port, fields)
                 return
             if must:
                 self.complain(f"{port.id}: PortChanged{fields} comes in place of {wanted}", port)
                 return
         self.complain(f"{port.id}: PortChanged{fields} has no cause", port)
+
+    @staticmethod
+    def _weaken(port: Port, fields: tuple) -> None:
+        """The signal may have been a later one, with the one before left out."""
+        port.expected = deque(
+            (wanted, must and wanted != fields, key) for wanted, must, key in port.expected
+        )
 
     def on_sequence_done(self, number: int) -> None:
         port = self.by_number.get(number)
@@ -280,8 +295,11 @@ class Model:
         port.running -= 1
         port.history.append("sequence done")
         # Calls that came before may have been served before or after the end.
-        port.ending |= {key for key, (_, of, *_rest) in self.open.items() if of is port}
+        port.ending |= self._open_calls(port)
         port.forget("raw")
+
+    def _open_calls(self, port: Port) -> set:
+        return {key for key, (_, of, *_rest) in self.open.items() if of is port}
 
     def complain(self, text: str, port: Optional[Port] = None) -> None:
         after = f"\n    after {list(port.history)}" if port else ""
@@ -623,7 +641,7 @@ class Model:
         if word not in ("input", "output"):
             return refused(INVALID)
         if port.is_input is None:
-            port.turn(word == "input")
+            port.turn(word == "input", must=False)
             return Answer(ANY, (INVALID,))
         if port.is_input != (word == "input"):
             if port.kind != "io_ctrl":
