@@ -3,6 +3,8 @@
 #include <memory>
 #include <optional>
 
+#include "base/heap.h"
+#include "base/main-queue.h"
 #include "dbus/bus-service.h"
 #include "dbus/with-port.h"
 #include "legacy/bridge.h"
@@ -168,6 +170,7 @@ gboolean start_action_sequence(IOControlState *object, GDBusMethodInvocation *in
                                gpointer /*user_data*/) {
   return with_any_port(invocation, number, [&](IOPort *port) {
     if (g_variant_n_children(steps) > kMaxSequenceSteps) {
+      post_to_main_loop(heap_trim);  // once the message, which is most of the heap, is gone
       return fail(invocation, IO_CONTROL_ERROR_GENERIC, "The sequence has too many steps.");
     }
     ActionSequence sequence = parse_sequence(is_virtual, steps);

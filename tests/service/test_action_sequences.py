@@ -196,6 +196,17 @@ def test_a_sequence_without_pauses_keeps_nobody_waiting(make_device):
     wait_for(lambda: resident_kib(device) - resident < allowed, "the memory to come back")
 
 
+def test_the_memory_of_a_sequence_that_is_refused_comes_back(make_device):
+    device = make_device()
+    device.environment["G_SLICE"] = "always-malloc"  # as the unit has it
+    device.conf(hwdesc(port("siren", OUTPUT, kind="output")))
+    device.start()
+    resident = resident_kib(device)
+    refused(device, OUTPUT, *[(True, 0)] * (MOST_STEPS + 1))
+    allowed = 384 * 1024 if device.sanitized else 2048
+    wait_for(lambda: resident_kib(device) - resident < allowed, "the memory to come back")
+
+
 def resident_kib(device: Device) -> int:
     return int(device.status("VmRSS").split()[0])
 
