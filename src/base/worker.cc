@@ -7,10 +7,10 @@
 
 namespace {
 
-// Every worker there is, for stop_all(). Main thread.
+// Every worker there is, for stop_all(). Main thread. Never destroyed: static objects have workers.
 std::vector<Worker *> &workers() {
-  static std::vector<Worker *> instance;
-  return instance;
+  static auto *const instance = new std::vector<Worker *>;
+  return *instance;
 }
 
 }  // namespace

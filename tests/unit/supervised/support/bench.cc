@@ -28,7 +28,8 @@ struct Timer {
 
 std::vector<Timer> all_timers;
 std::vector<std::string> all_reports;
-std::vector<std::string> all_logged;
+std::mutex logged_lock;
+std::vector<std::string> all_logged;  // guarded by logged_lock
 std::vector<std::string> broken_files;
 std::vector<std::string> broken_devices;
 std::deque<std::string> coming_texts;
@@ -63,7 +64,7 @@ void forget_dead_timers() {
   std::erase_if(all_timers, [](const Timer &timer) { return !armed(timer); });
 }
 
-const char *level_word(GLogLevelFlags level) {
+const char *level_word(int level) {
   switch (level & G_LOG_LEVEL_MASK) {
     case G_LOG_LEVEL_CRITICAL:
       return "critical";
@@ -74,12 +75,16 @@ const char *level_word(GLogLevelFlags level) {
   }
 }
 
-// What is logged by a library is a mistake that the daemon made in calling it.
-void on_log(const gchar *domain, GLogLevelFlags level, const gchar *text, gpointer /*user_data*/) {
+// What is logged by a library is a mistake that the daemon made in calling it. Applications have
+// levels that the type does not hold.
+__attribute__((no_sanitize("enum"))) void on_log(const gchar *domain, GLogLevelFlags level,
+                                                 const gchar *text, gpointer /*user_data*/) {
   if (g_strcmp0(domain, G_LOG_DOMAIN) != 0) {
     ADD_FAILURE() << (domain ? domain : "(no domain)") << ": " << text;
   }
-  all_logged.push_back(std::string(level_word(level)) + ": " + text);
+  const int number = level;
+  const std::lock_guard lock(logged_lock);
+  all_logged.push_back(std::string(level_word(number)) + ": " + text);
 }
 
 void on_port_changed(const PortChange &change) {
@@ -143,7 +148,10 @@ extern "C" void g_usleep(gulong /*microseconds*/) {}
 Bench::Bench() : root_(make_folder()), lines_(root_) {
   g_log_set_default_handler(on_log, nullptr);
   all_reports.clear();
-  all_logged.clear();
+  {
+    const std::lock_guard lock(logged_lock);
+    all_logged.clear();
+  }
   coming_texts.clear();
   port_listener() = {};
   port_listener().port_changed = on_port_changed;
@@ -265,10 +273,12 @@ std::vector<std::string> Bench::reports() {
 }
 
 std::vector<std::string> Bench::logged() {
+  const std::lock_guard lock(logged_lock);
   return std::exchange(all_logged, {});
 }
 
 bool Bench::was_logged(std::string_view line) {
+  const std::lock_guard lock(logged_lock);
   return std::find(all_logged.begin(), all_logged.end(), line) != all_logged.end();
 }
 
