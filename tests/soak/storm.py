@@ -572,17 +572,23 @@ class Soak:
         descriptors = self.device.descriptors_at_rest()
         return int(self.device.status("VmRSS").split()[0]), len(descriptors), threads(self.device)
 
-    def problems(self) -> list[str]:
-        """What fails the run."""
+    def growth(self) -> list[str]:
+        """What is more after the storm than before."""
         (memory, descriptors, names), (memory_now, descriptors_now, names_now) = (
             self.figures[0], self.figures[-1])  # fmt: skip
-        problems = [f"mismatch: {text_[:1500]}" for text_ in self.model.mismatches[:20]]
+        problems = []
         if not self.device.sanitized and memory_now > memory + MEMORY_LIMIT:
             problems.append(f"memory grew from {memory} to {memory_now} KiB")
         if descriptors_now > descriptors:
             problems.append(f"descriptors grew from {descriptors} to {descriptors_now}")
         if names_now - names:
             problems.append(f"threads were left: {names_now - names}")
+        return problems
+
+    def problems(self) -> list[str]:
+        """What fails the run."""
+        problems = [f"mismatch: {text_[:1500]}" for text_ in self.model.mismatches[:20]]
+        problems += self.growth()
         if self.probe.longest()[0] > STALL_LIMIT * scale():
             problems.append(f"a caller waited for {self.probe.longest()[0] * 1000:.0f} ms")
         return problems
