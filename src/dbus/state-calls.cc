@@ -202,17 +202,18 @@ void serve(Call &call) {
 }
 
 // Whatever comes later goes into another batch.
-std::vector<Call> take_calls(Batch *batch) {
+std::vector<Call> take_calls(const BatchPtr *holder) {
   StateCalls &calls = state_calls();
   const std::lock_guard lock(calls.lock);
-  if (calls.growing.get() == batch) {
+  const BatchPtr &batch = *holder;
+  if (calls.growing == batch) {
     calls.growing.reset();
   }
   return std::exchange(batch->calls, {});
 }
 
 gboolean serve_batch(gpointer user_data) {
-  for (Call &call : take_calls(static_cast<BatchPtr *>(user_data)->get())) {
+  for (Call &call : take_calls(static_cast<const BatchPtr *>(user_data))) {
     serve(call);
   }
   save_now_or_soon();
