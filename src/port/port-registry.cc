@@ -154,15 +154,14 @@ void retry_parked() {
 // In the order of the description. Gives the number of those in service.
 std::size_t log_service_of(const std::vector<IOPortRef> &ports, const char *otherwise) {
   std::size_t in_service = 0;
-  for (auto place = ports.rbegin(); place != ports.rend(); ++place) {
-    IOPort *port = place->get();
-    if (io_port_in_service(port)) {
+  std::for_each(ports.rbegin(), ports.rend(), [&](const IOPortRef &port) {
+    if (io_port_in_service(port.get())) {
       ++in_service;
     } else {
-      log_warning("Port %s, number %d, is out of service %s: %s", io_port_describe(port),
-                  port->number, otherwise, io_port_fault(port).c_str());
+      log_warning("Port %s, number %d, is out of service %s: %s", io_port_describe(port.get()),
+                  port->number, otherwise, io_port_fault(port.get()).c_str());
     }
-  }
+  });
   return in_service;
 }
 
