@@ -34,7 +34,7 @@ device_packages=(
   linux-source-6.1 make qemu-system-mips qemu-user xz-utils
 )
 package_packages=(
-  debhelper dpkg-dev lintian lowdown mmdebstrap python3-pytest systemd systemd-container
+  build-essential debhelper dpkg-dev lintian lowdown mmdebstrap python3-pytest systemd systemd-container
 )
 
 step() { printf '\n=== %s\n' "$*"; }

@@ -4,7 +4,7 @@
 
 namespace {
 
-constexpr long kMostBytes = 300 * 1024;
+constexpr long kMostBytes = 300L * 1024;
 
 TEST(Image, LeavesRoomForOthers) {
   struct stat info {};

@@ -23,6 +23,7 @@ void wait_for_notifier(Wait wait) {
   });
   {
     std::unique_lock lock(mutex);
+    // NOLINTNEXTLINE(bugprone-infinite-loop): another thread ends it
     while (!ready) {
       wait(condition, lock);
     }

@@ -38,7 +38,7 @@ std::string tree_file(int fd) {
 
 std::string make_root() {
   std::string path = (fs::temp_directory_path() / "portd-gpio-XXXXXX").string();
-  const std::string root = g_mkdtemp(path.data());
+  std::string root = g_mkdtemp(path.data());
   // Tests that do without root's rights must still come in.
   fs::permissions(root, fs::perms(0755));
   return root;

@@ -20,6 +20,7 @@ constexpr const char *kControl = "/run/udev/control";
 
 pid_t run(std::vector<std::string> words) {
   std::vector<char *> arguments;
+  arguments.reserve(words.size() + 1);
   for (std::string &word : words) {
     arguments.push_back(word.data());
   }
