@@ -291,6 +291,22 @@ class ThresholdsOfTheKernel : public Thresholds {
       EXPECT_EQ(status.st_mode & (S_IWGRP | S_IWOTH), 0U) << file;
     }
   }
+  // Two watched channels of a converter that goes away and comes back.
+  void start_and_replug() {
+    plug_in();
+    start(port(0, 0) + port(1, 1));
+    supervise_all(2);
+    MockIio::unplug();
+    EXPECT_TRUE(wait_until([] { return Daemon::logged("read Error: "); }));
+    MockIio::plug();
+  }
+  void expect_both_watched() {
+    for (const int channel : {0, 1}) {
+      EXPECT_TRUE(becomes_enabled(channel, {1, 1})) << channel;
+      MockIio::set_value(channel, kCut);
+      EXPECT_TRUE(reads(channel, "cut", kCut));
+    }
+  }
 };
 
 TEST_F(ThresholdsOfTheKernel, ReadsThatFailCostNothing) {
@@ -326,37 +342,19 @@ TEST_F(ThresholdsOfTheKernel, SwitchedOffAndOnAPortThatCouldNotBeReadIsBack) {
 }
 
 TEST_F(ThresholdsOfTheKernel, AConverterThatIsBackIsUsedAsSoonAsTheAccountMay) {
-  plug_in();
-  start(port(0, 0) + port(1, 1));
-  supervise_all(2);
-  MockIio::unplug();
-  EXPECT_TRUE(wait_until([] { return Daemon::logged("read Error: "); }));
-  MockIio::plug();
+  start_and_replug();
   EXPECT_TRUE(wait_until([] { return Daemon::log_count("mock-adc0 is back, but ") == 2; }));
   expect_no_rights();
   grant(MockIio::node());
   grant_tree(MockIio::folder());
-  for (const int channel : {0, 1}) {
-    EXPECT_TRUE(becomes_enabled(channel, {1, 1})) << channel;
-    MockIio::set_value(channel, kCut);
-    EXPECT_TRUE(reads(channel, "cut", kCut));
-  }
+  expect_both_watched();
   EXPECT_EQ(Daemon::log_count("mock-adc0 is back, but "), 2);  // once for each port
 }
 
 TEST_F(ThresholdsOfTheKernel, TheInstalledRulesAreEnoughForAConverterThatComesBack) {
   const DeviceManager manager;
-  plug_in();
-  start(port(0, 0) + port(1, 1));
-  supervise_all(2);
-  MockIio::unplug();
-  EXPECT_TRUE(wait_until([] { return Daemon::logged("read Error: "); }));
-  MockIio::plug();
-  for (const int channel : {0, 1}) {
-    EXPECT_TRUE(becomes_enabled(channel, {1, 1})) << channel;
-    MockIio::set_value(channel, kCut);
-    EXPECT_TRUE(reads(channel, "cut", kCut));
-  }
+  start_and_replug();
+  expect_both_watched();
 }
 
 }  // namespace
