@@ -12,8 +12,7 @@ struct OwnerWatch::State : std::enable_shared_from_this<State> {
   std::optional<std::string> notified;  // what `changed` was last called with
 
   void update(GDBusConnection *now_connection, const char *now_owner) {
-    connection.reset(now_connection ? static_cast<GDBusConnection *>(g_object_ref(now_connection))
-                                    : nullptr);
+    connection = now_connection ? gobject_reference(now_connection) : nullptr;
     owner = now_owner;
     // Deferred: a name that changes its owner vanishes and appears in the same dispatch.
     post_to_main_loop([watch = weak_from_this()] {
@@ -66,7 +65,7 @@ void delete_handler(gpointer handler) {
 
 SignalSubscription::SignalSubscription(GDBusConnection *connection, const std::string &sender,
                                        const char *interface, const char *member, Handler handler)
-    : connection_(static_cast<GDBusConnection *>(g_object_ref(connection))),
+    : connection_(gobject_reference(connection)),
       id_(g_dbus_connection_signal_subscribe(connection, sender.c_str(), interface, member, nullptr,
                                              nullptr, G_DBUS_SIGNAL_FLAGS_NONE, on_signal,
                                              new Handler(std::move(handler)), delete_handler)) {}

@@ -22,11 +22,20 @@ using GStrvPtr = std::unique_ptr<char *, GlibDeleter<g_strfreev>>;
 using GVariantPtr = std::unique_ptr<GVariant, GlibDeleter<g_variant_unref>>;
 using GKeyFilePtr = std::unique_ptr<GKeyFile, GlibDeleter<g_key_file_unref>>;
 using GDirPtr = std::unique_ptr<GDir, GlibDeleter<g_dir_close>>;
+using GDBusNodeInfoPtr = std::unique_ptr<GDBusNodeInfo, GlibDeleter<g_dbus_node_info_unref>>;
+using GMainContextPtr = std::unique_ptr<GMainContext, GlibDeleter<g_main_context_unref>>;
 using GMainLoopPtr = std::unique_ptr<GMainLoop, GlibDeleter<g_main_loop_unref>>;
+using GSourcePtr = std::unique_ptr<GSource, GlibDeleter<g_source_unref>>;
 using GMarkupContextPtr =
     std::unique_ptr<GMarkupParseContext, GlibDeleter<g_markup_parse_context_free>>;
 template <typename T>
 using GObjectPtr = std::unique_ptr<T, GlibDeleter<g_object_unref>>;
+
+// One more reference to an object.
+template <typename T>
+GObjectPtr<T> gobject_reference(T *object) {
+  return GObjectPtr<T>(static_cast<T *>(g_object_ref(object)));
+}
 
 // A GError to pass to a GLib call. Empty until a call sets it; asking for out() again drops what
 // the last call left, so one variable serves several calls in turn.

@@ -15,9 +15,6 @@ namespace {
 // Within the five seconds that a daemon has to end.
 constexpr guint kForcedExitMs = 4800;
 
-using MainContextPtr = std::unique_ptr<GMainContext, GlibDeleter<g_main_context_unref>>;
-using SourcePtr = std::unique_ptr<GSource, GlibDeleter<g_source_unref>>;
-
 // The log may be what hangs, or standard error, if nobody reads it.
 gboolean on_forced_exit(gpointer /*user_data*/) {
   constexpr std::string_view message = "portd did not stop in time\n";
@@ -30,14 +27,14 @@ gboolean on_forced_exit(gpointer /*user_data*/) {
 
 gboolean on_sigterm(gpointer user_data) {
   g_cancellable_cancel(termination_cancellable());
-  const SourcePtr forced_exit(g_timeout_source_new(kForcedExitMs));
+  const GSourcePtr forced_exit(g_timeout_source_new(kForcedExitMs));
   g_source_set_callback(forced_exit.get(), on_forced_exit, nullptr, nullptr);
   g_source_attach(forced_exit.get(), static_cast<GMainContext *>(user_data));
   return G_SOURCE_REMOVE;
 }
 
 gpointer watch(gpointer context) {
-  const MainContextPtr owned(static_cast<GMainContext *>(context));
+  const GMainContextPtr owned(static_cast<GMainContext *>(context));
   while (true) {
     g_main_context_iteration(owned.get(), TRUE);
   }
@@ -53,7 +50,7 @@ GCancellable *termination_cancellable() {
 
 bool termination_watch() {
   GMainContext *context = g_main_context_new();
-  const SourcePtr sigterm(g_unix_signal_source_new(SIGTERM));
+  const GSourcePtr sigterm(g_unix_signal_source_new(SIGTERM));
   g_source_set_callback(sigterm.get(), on_sigterm, context, nullptr);
   g_source_attach(sigterm.get(), context);
   Error error;

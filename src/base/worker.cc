@@ -29,8 +29,7 @@ bool Worker::queue(Job job) {
   if (stopped_ || !start_thread()) {
     return false;
   }
-  auto *cancellable = static_cast<GCancellable *>(g_object_ref(cancellable_.get()));
-  jobs_.push_back({std::move(job), GObjectPtr<GCancellable>(cancellable)});
+  jobs_.push_back({std::move(job), gobject_reference(cancellable_.get())});
   wake_up_.notify_all();
   return true;
 }

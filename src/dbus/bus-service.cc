@@ -29,7 +29,7 @@ void BusService::open(GDBusConnection *connection) {
   if (!g_dbus_interface_skeleton_export(object_.get(), connection, path_, error.out())) {
     log_warning("Could not export %s: %s", path_, error.message());
   }
-  connection_.reset(static_cast<GDBusConnection *>(g_object_ref(connection)));
+  connection_ = gobject_reference(connection);
   request_name();
 }
 

@@ -41,8 +41,7 @@ void save(IOPort *port) {
 // Other callers are not held up.
 template <typename Answer>
 void answer_and_save(IOPort *port, Answer answer) {
-  io_port_ref(port);
-  const std::shared_ptr<IOPort> kept(port, io_port_unref);
+  const std::shared_ptr<IOPort> kept = io_port_new_reference(port);
   io_port_when_idle(port, [kept, answer] {
     answer();
     save(kept.get());

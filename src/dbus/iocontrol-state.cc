@@ -34,7 +34,7 @@ GObjectPtr<GDBusConnection> current_bus() {
   GObjectPtr<GDBusConnection> bus;
   service.with_object([&](GDBusInterfaceSkeleton *object) {
     if (GDBusConnection *connection = g_dbus_interface_skeleton_get_connection(object)) {
-      bus.reset(static_cast<GDBusConnection *>(g_object_ref(connection)));
+      bus = gobject_reference(connection);
     }
   });
   return bus;

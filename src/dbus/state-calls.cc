@@ -19,7 +19,7 @@ namespace {
 constexpr guint kSavePause = 100;  // milliseconds
 
 constexpr guint kPauseMs = 1;
-constexpr gint64 kPauseUs = 1000;
+constexpr gint64 kPauseUs = kPauseMs * G_TIME_SPAN_MILLISECOND;
 
 using MessagePtr = GObjectPtr<GDBusMessage>;
 
@@ -229,7 +229,7 @@ void state_calls_start(GDBusConnection *connection, const char *path, const char
     calls.path = path;
     calls.interface = interface;
   }
-  calls.connection.reset(static_cast<GDBusConnection *>(g_object_ref(connection)));
+  calls.connection = gobject_reference(connection);
   calls.filter = g_dbus_connection_add_filter(connection, take_call, nullptr, nullptr);
 }
 

@@ -14,9 +14,6 @@ namespace {
 constexpr guint kRetrySeconds = 1;
 constexpr guint kFlushTimeoutMs = 1000;
 
-using MainContextPtr = std::unique_ptr<GMainContext, GlibDeleter<g_main_context_unref>>;
-using SourcePtr = std::unique_ptr<GSource, GlibDeleter<g_source_unref>>;
-
 struct SystemBus {
   GObjectPtr<GDBusConnection> connection;
   std::vector<std::function<void(GDBusConnection *)>> waiting;
@@ -82,11 +79,11 @@ gboolean on_flush_timeout(gpointer user_data) {
 // A context of its own: nothing else of the daemon may run any more, and the result of a flush that
 // ends after the timeout is discarded.
 void flush(GDBusConnection *connection) {
-  const MainContextPtr context(g_main_context_new());
+  const GMainContextPtr context(g_main_context_new());
   g_main_context_push_thread_default(context.get());
   bool finished = false;
   g_dbus_connection_flush(connection, nullptr, on_flushed, &finished);
-  const SourcePtr timeout(g_timeout_source_new(kFlushTimeoutMs));
+  const GSourcePtr timeout(g_timeout_source_new(kFlushTimeoutMs));
   g_source_set_callback(timeout.get(), on_flush_timeout, &finished, nullptr);
   g_source_attach(timeout.get(), context.get());
   while (!finished) {

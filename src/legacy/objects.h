@@ -9,8 +9,6 @@
 
 #include "base/glib-ptr.h"
 
-using GDBusNodeInfoPtr = std::unique_ptr<GDBusNodeInfo, GlibDeleter<g_dbus_node_info_unref>>;
-
 struct LegacyController {
   GObjectPtr<GDBusConnection> connection;
   GDBusNodeInfoPtr introspection;

@@ -58,8 +58,7 @@ GObjectPtr<GCancellable> begin_sequence(IOPort *port) {
   port->sequence_running = true;
   port->cancel_sequence = false;
   port->sequence_cancelled.reset(g_cancellable_new());
-  return GObjectPtr<GCancellable>(
-      static_cast<GCancellable *>(g_object_ref(port->sequence_cancelled.get())));
+  return gobject_reference(port->sequence_cancelled.get());
 }
 
 // Fixed: the product wraps in 32 bits.
@@ -149,9 +148,8 @@ gpointer run_sequence(gpointer data) {
 }
 
 bool start_thread(IOPort *port, GObjectPtr<GCancellable> cancelled, ActionSequence sequence) {
-  io_port_ref(port);
   auto job = std::make_unique<ActionJob>(
-      ActionJob{IOPortRef(port), std::move(cancelled), std::move(sequence)});
+      ActionJob{io_port_new_reference(port), std::move(cancelled), std::move(sequence)});
   thread_started();
   Error error;
   GThread *thread = g_thread_try_new(kThreadName, run_sequence, job.get(), error.out());

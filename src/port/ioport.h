@@ -47,6 +47,12 @@ struct IOPortUnref {
 };
 using IOPortRef = std::unique_ptr<IOPort, IOPortUnref>;
 
+// One more reference, or none where there is no port.
+inline IOPortRef io_port_new_reference(IOPort *port) {
+  io_port_ref(port);
+  return IOPortRef(port);
+}
+
 // --- Backend ------------------------------------------------------------------------------------
 
 // Makes a backend known, in place of an earlier one of its kind. Its word and its table must stay

@@ -24,11 +24,6 @@ Registry &registry() {
   return instance;
 }
 
-IOPortRef new_reference(IOPort *port) {
-  io_port_ref(port);
-  return IOPortRef(port);
-}
-
 bool is_addressable(const IOPort *port) {
   return io_port_is_ioport(port) || io_port_get_flag(port, "virtual");
 }
@@ -37,7 +32,7 @@ IOPortRef find_in(const Ports &ports, std::uint32_t number) {
   const auto found = std::find_if(ports.rbegin(), ports.rend(), [&](const IOPort *port) {
     return std::cmp_equal(port->number, number) && is_addressable(port);
   });
-  return found == ports.rend() ? nullptr : new_reference(*found);
+  return found == ports.rend() ? nullptr : io_port_new_reference(*found);
 }
 
 void prepend(Ports &ports, IOPort *port) {
@@ -85,7 +80,7 @@ std::size_t move_ports(Ports &from, Ports &to, Predicate moves) {
 std::vector<IOPortRef> snapshot(const Ports &list) {
   const std::lock_guard lock(registry().lock);
   std::vector<IOPortRef> ports;
-  std::transform(list.begin(), list.end(), std::back_inserter(ports), new_reference);
+  std::transform(list.begin(), list.end(), std::back_inserter(ports), io_port_new_reference);
   return ports;
 }
 
@@ -200,7 +195,7 @@ void port_registry_add(IOPort *port) {
 IOPortRef port_registry_nth(std::size_t n) {
   const std::lock_guard lock(registry().lock);
   const auto &ports = registry().active;
-  return n < ports.size() ? new_reference(ports[n]) : nullptr;
+  return n < ports.size() ? io_port_new_reference(ports[n]) : nullptr;
 }
 
 IOPortRef port_registry_find(std::uint32_t number) {
@@ -222,7 +217,7 @@ IOPort *port_registry_find_by_id_locked(const std::string &id) {
 
 IOPortRef port_registry_get_by_id(const std::string &id) {
   const std::lock_guard lock(registry().lock);
-  return new_reference(port_registry_find_by_id_locked(id));
+  return io_port_new_reference(port_registry_find_by_id_locked(id));
 }
 
 void port_registry_remove_by_id(const std::string &id) {

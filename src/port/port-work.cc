@@ -8,11 +8,6 @@
 
 namespace {
 
-IOPortRef new_reference(IOPort *port) {
-  io_port_ref(port);
-  return IOPortRef(port);
-}
-
 // The callbacks that have waited long enough. The caller holds the lock.
 std::vector<std::function<void()>> take_due(BackgroundWork &work) {
   std::vector<std::function<void()>> due;
@@ -28,7 +23,7 @@ std::vector<std::function<void()>> take_due(BackgroundWork &work) {
 
 }  // namespace
 
-PortWork::PortWork(IOPort *port) : port_(new_reference(port)) {
+PortWork::PortWork(IOPort *port) : port_(io_port_new_reference(port)) {
   BackgroundWork &work = port->background;
   const std::lock_guard lock(work.lock);
   ++work.begun;

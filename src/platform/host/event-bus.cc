@@ -22,8 +22,6 @@ constexpr std::size_t kMaxQueued = 1024;
 // Nothing tells when a bus appears, so it is looked for.
 constexpr guint kRetrySeconds = 1;
 
-using NodeInfoPtr = std::unique_ptr<GDBusNodeInfo, GlibDeleter<g_dbus_node_info_unref>>;
-
 struct Answer {
   Inspectable values;
   guint64 sends;
@@ -95,7 +93,7 @@ void emit(const EventLibrary &library, const EventProducer &producer, const Even
 }
 
 void register_object(const EventLibrary &library, EventProducer &producer) {
-  const NodeInfoPtr node(g_dbus_node_info_new_for_xml(kIntrospection, nullptr));
+  const GDBusNodeInfoPtr node(g_dbus_node_info_new_for_xml(kIntrospection, nullptr));
   Error error;
   producer.registration = g_dbus_connection_register_object(
       library.connection.get(), producer.path.c_str(), node->interfaces[0], &kVtable, nullptr,
